@@ -1,0 +1,224 @@
+#include "net/config_utils.h"
+
+#include <stdlib.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <fstream>
+#include <sstream>
+#include <string>
+#include <vector>
+
+#include <android-base/file.h>
+#include <gtest/gtest.h>
+
+#include "tests/log_capture.h"
+
+namespace hardware {
+namespace dalix {
+namespace {
+
+using Map = ConfigUtils::Map;
+
+class ConfigUtilsTest : public ::testing::Test {
+ protected:
+  std::string WriteFile(const std::string& name, const std::string& text) {
+    std::string path = std::string(dir_.path) + "/" + name;
+    std::ofstream(path, std::ios::binary) << text;
+    return path;
+  }
+
+  std::string ReadFile(const std::string& path) {
+    std::ifstream in(path, std::ios::binary);
+    std::stringstream text;
+    text << in.rdbuf();
+    return text.str();
+  }
+
+  static Map Contents(ConfigUtils& store) { return Map(store.GetIterator(), store.GetEnd()); }
+
+  std::vector<std::string> Keys(bool restart_first) {
+    std::vector<std::string> keys;
+    for (const char* key = store_.GetNext(restart_first); key; key = store_.GetNext(false)) {
+      keys.emplace_back(key);
+    }
+    return keys;
+  }
+
+  TemporaryDir dir_;
+  ConfigUtils store_;
+};
+
+TEST(TrimTest, StripsBlanksAndControlWhitespaceAtTheEndsOnly) {
+  const struct {
+    std::string in, out;
+  } cases[] = {
+      {"", ""},
+      {" \t\n\v\f\r", ""},
+      {"  a b  ", "a b"},
+      {"\ta\tb\r", "a\tb"},
+      {"x", "x"},
+      {"\x01x\x0e", "\x01x\x0e"},
+  };
+  for (const auto& c : cases) {
+    std::string s = c.in;
+    trim(&s);
+    EXPECT_EQ(c.out, s) << "input [" << c.in << "]";
+  }
+}
+
+TEST_F(ConfigUtilsTest, ParsesLinesByTheFileRules) {
+  const struct {
+    const char* what;
+    std::string text;
+    Map expected;
+  } cases[] = {
+      {"plain pairs", "a=1\nb = 2\n", {{"a", "1"}, {"b", "2"}}},
+      {"comment after value", "a=1 ; x\n", {{"a", "1"}}},
+      {"hash comment after value", "a = 1#x=2\n", {{"a", "1"}}},
+      {"whole-line comment", "# a=1\n", {}},
+      {"comment before equals", "a;=1\n", {}},
+      {"equals last on line", "a=\n", {}},
+      {"blank after equals", "a= \n", {{"a", ""}}},
+      {"value holds equals", "a = b = c\n", {{"a", "b = c"}}},
+      {"no equals", "just words\n\n", {}},
+      {"empty key", "=v\n", {{"", "v"}}},
+      {"later line wins", "k=1\nk=2\n", {{"k", "2"}}},
+      {"keys are case-sensitive", "K=1\nk=2\n", {{"K", "1"}, {"k", "2"}}},
+      {"inner blanks kept", "\t my key \t=\t a  b \t\n", {{"my key", "a  b"}}},
+      {"CR LF line ends", "a=1\r\nb=2\r\n", {{"a", "1"}, {"b", "2"}}},
+      {"no final newline", "a=1\nb=2", {{"a", "1"}, {"b", "2"}}},
+      {"CR before LF after equals", "a=\r\n", {{"a", ""}}},
+      {"comment right after equals", "a=;\n", {{"a", ""}}},
+      {"empty file", "", {}},
+  };
+  for (const auto& c : cases) {
+    ConfigUtils store;
+    ASSERT_TRUE(store.Load(WriteFile("c.conf", c.text).c_str())) << c.what;
+    EXPECT_EQ(c.expected, Contents(store)) << c.what;
+  }
+}
+
+TEST_F(ConfigUtilsTest, HostileFilesLoadWithoutHarm) {
+  std::string long_value(1 << 20, 'v');
+  std::string binary;
+  for (int i = 0; i < 4096; ++i) binary.push_back(static_cast<char>(i * 7919 % 256));
+
+  ASSERT_TRUE(store_.Load(WriteFile("long.conf", "key=" + long_value + "\nafter=1\n").c_str()));
+  EXPECT_EQ(long_value, store_.GetValue("key"));
+  EXPECT_STREQ("1", store_.GetValue("after"));
+
+  ConfigUtils binary_store;
+  EXPECT_TRUE(binary_store.Load(WriteFile("bin.conf", binary + "\nok=yes\n").c_str()));
+  EXPECT_STREQ("yes", binary_store.GetValue("ok"));
+
+  // A NUL inside a line is part of it, not its end.
+  ConfigUtils nul_store;
+  EXPECT_TRUE(nul_store.Load(WriteFile("nul.conf", std::string("a=1\0b=2\n", 8)).c_str()));
+  EXPECT_EQ((Map{{"a", std::string("1\0b=2", 5)}}), Contents(nul_store));
+
+  // A directory opens but reads nothing.
+  ConfigUtils dir_store;
+  EXPECT_TRUE(dir_store.Load(dir_.path));
+  EXPECT_TRUE(dir_store.IsEmpty());
+}
+
+TEST_F(ConfigUtilsTest, UnreadablePathsAreRefusedWithTheirLogLines) {
+  LogCapture log;
+  const std::string missing = std::string(dir_.path) + "/missing.conf";
+  EXPECT_FALSE(store_.Load(missing.c_str()));
+  EXPECT_FALSE(store_.Load(nullptr));
+  EXPECT_FALSE(store_.Save(nullptr));
+  const std::string unwritable = std::string(dir_.path) + "/no/such/dir.conf";
+  EXPECT_FALSE(store_.Save(unwritable.c_str()));
+  EXPECT_EQ(nullptr, store_.GetValue(nullptr));
+  EXPECT_FALSE(store_.Set(nullptr, "v"));
+  EXPECT_FALSE(store_.Set("k", nullptr));
+  EXPECT_TRUE(store_.IsEmpty());
+
+  const char* tag = "dalix.uwb.CongifUtils";
+  EXPECT_TRUE(log.Contains(android::base::ERROR, "Load Cannot open file: " + missing, tag));
+  EXPECT_TRUE(log.Contains(android::base::ERROR, "Load Bad argument", tag));
+  EXPECT_TRUE(log.Contains(android::base::ERROR, "Save Bad argument", tag));
+  EXPECT_TRUE(log.Contains(android::base::ERROR, "Save Cannot open file: " + unwritable, tag));
+  EXPECT_TRUE(log.Contains(android::base::ERROR, "GetValue Bad argument", tag));
+  EXPECT_EQ(2, log.Count(android::base::ERROR, "Set Bad argument", tag)) << log.Text();
+
+  if (getuid() != 0) {
+    const std::string locked = WriteFile("locked.conf", "a=1\n");
+    chmod(locked.c_str(), 0);
+    EXPECT_FALSE(store_.Load(locked.c_str()));
+  }
+}
+
+TEST_F(ConfigUtilsTest, LoadingTwoFilesMergesThemWithTheSecondWinning) {
+  ASSERT_TRUE(store_.Load(WriteFile("one.conf", "a=1\nb=2\n").c_str()));
+  ASSERT_TRUE(store_.Load(WriteFile("two.conf", "b=20\nc=30\n").c_str()));
+  EXPECT_EQ((Map{{"a", "1"}, {"b", "20"}, {"c", "30"}}), Contents(store_));
+  EXPECT_FALSE(store_.Load("/nonexistent/dir/x.conf"));
+  EXPECT_EQ(3u, Contents(store_).size());
+}
+
+TEST_F(ConfigUtilsTest, SaveWritesEntriesBackToBack) {
+  const std::string path = WriteFile("out.conf", "old contents that must go");
+  ASSERT_TRUE(store_.Save(path.c_str()));
+  EXPECT_EQ("", ReadFile(path));
+  store_.Set("b", "2");
+  store_.Set("a", "1");
+  ASSERT_TRUE(store_.Save(path.c_str()));
+  EXPECT_EQ("a = 1b = 2", ReadFile(path));
+}
+
+TEST_F(ConfigUtilsTest, SetStoresUnchangedAndDumpLogsInKeyOrder) {
+  LogCapture log;
+  EXPECT_TRUE(store_.Set(" k ", " v "));
+  EXPECT_TRUE(store_.Set("a", "1"));
+  EXPECT_STREQ(" v ", store_.GetValue(" k "));
+  EXPECT_EQ(nullptr, store_.GetValue("k"));
+  store_.Dump();
+  std::vector<std::string> dumped;
+  for (const auto& entry : log.Entries()) {
+    if (entry.message.rfind("Dump", 0) == 0) {
+      EXPECT_EQ(android::base::INFO, entry.severity);
+      EXPECT_EQ("dalix.uwb.CongifUtils", entry.tag);
+      dumped.push_back(entry.message);
+    }
+  }
+  EXPECT_EQ((std::vector<std::string>{"Dump  k = v ", "Dump a=1"}), dumped);
+}
+
+TEST_F(ConfigUtilsTest, GetNextFollowsItsCursorRules) {
+  // Fresh store: nothing placed the cursor yet.
+  EXPECT_EQ(nullptr, store_.GetNext(false));
+  EXPECT_EQ(nullptr, store_.GetNext(true));
+  EXPECT_EQ(nullptr, store_.GetNext(false));
+
+  store_.Load(WriteFile("k.conf", "b=2\na=1\nc=3\n").c_str());
+  EXPECT_EQ((std::vector<std::string>{"a", "b", "c"}), Keys(true));
+  // The null that ended the walk rewound it.
+  EXPECT_EQ((std::vector<std::string>{"a", "b", "c"}), Keys(false));
+
+  // Set places the cursor on the first entry, mid-walk or not.
+  EXPECT_STREQ("a", store_.GetNext(true));
+  EXPECT_STREQ("b", store_.GetNext(false));
+  store_.Set("0", "zero");
+  EXPECT_EQ((std::vector<std::string>{"0", "a", "b", "c"}), Keys(false));
+
+  LogCapture log;
+  EXPECT_STREQ("0", store_.GetNext(true));
+  EXPECT_TRUE(log.Contains(android::base::INFO, "GetNext 0=zero", "dalix.uwb.CongifUtils"));
+
+  // Clear leaves the cursor alone; the walk must start again with restart.
+  store_.Clear();
+  EXPECT_TRUE(store_.IsEmpty());
+  store_.Load(WriteFile("x.conf", "x=1\n").c_str());
+  EXPECT_EQ(nullptr, store_.GetNext(false));
+  EXPECT_EQ((std::vector<std::string>{"x"}), Keys(true));
+  store_.Clear();
+  EXPECT_EQ(nullptr, store_.GetNext(true));
+  EXPECT_EQ(nullptr, store_.GetNext(false));
+}
+
+}  // namespace
+}  // namespace dalix
+}  // namespace hardware

@@ -1,0 +1,55 @@
+#include "tests/log_capture.h"
+
+#include <sstream>
+
+namespace hardware {
+namespace dalix {
+
+LogCapture::LogCapture()
+    : previous_minimum_(android::base::SetMinimumLogSeverity(android::base::VERBOSE)) {
+  android::base::SetLogger([this](android::base::LogId, android::base::LogSeverity severity,
+                                  const char* tag, const char*, unsigned int, const char* message) {
+    std::lock_guard<std::mutex> lock(mutex_);
+    entries_.push_back({severity, tag ? tag : "", message ? message : ""});
+  });
+}
+
+LogCapture::~LogCapture() {
+  android::base::SetLogger(android::base::StderrLogger);
+  android::base::SetMinimumLogSeverity(previous_minimum_);
+}
+
+std::vector<LogCapture::Entry> LogCapture::Entries() const {
+  std::lock_guard<std::mutex> lock(mutex_);
+  return entries_;
+}
+
+int LogCapture::Count(android::base::LogSeverity severity, const std::string& message,
+                      const char* tag) const {
+  std::lock_guard<std::mutex> lock(mutex_);
+  int count = 0;
+  for (const Entry& entry : entries_) {
+    if (entry.severity == severity && entry.message == message &&
+        (tag == nullptr || entry.tag == tag)) {
+      ++count;
+    }
+  }
+  return count;
+}
+
+std::string LogCapture::Text() const {
+  std::lock_guard<std::mutex> lock(mutex_);
+  std::ostringstream out;
+  for (const Entry& entry : entries_) {
+    out << entry.severity << " " << entry.tag << ": " << entry.message << "\n";
+  }
+  return out.str();
+}
+
+void LogCapture::Reset() {
+  std::lock_guard<std::mutex> lock(mutex_);
+  entries_.clear();
+}
+
+}  // namespace dalix
+}  // namespace hardware

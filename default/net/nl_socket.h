@@ -1,0 +1,52 @@
+#pragma once
+
+#include <functional>
+#include <memory>
+
+#include <netlink/netlink.h>
+
+#include "looper/event_loop.h"
+#include "net/nl_message_reader.h"
+
+namespace hardware {
+namespace dalix {
+
+// One connected generic netlink socket: blocking request/acknowledge and
+// request/response exchanges, single reads, and a watch on the event loop for
+// unsolicited driver messages. Used on the service thread only.
+class NlSocket {
+ public:
+  explicit NlSocket(EventLoop* event_loop);
+  virtual ~NlSocket();
+  NlSocket(const NlSocket&) = delete;
+  NlSocket& operator=(const NlSocket&) = delete;
+
+  virtual bool Setup();
+  virtual bool IsValid();
+  virtual void DisableAutoAck();
+  virtual void DisableSeqCheck();
+  virtual int Resolve(const char* family);
+  virtual bool ReceiveMessage(std::function<int(nl_msg*)> handler);
+  virtual bool SendAndAwaitAck(nl_msg* msg, std::function<int(nl_msg*)> on_message);
+  virtual bool SendAndAwaitResponse(nl_msg* msg, std::function<void(nl_msg*)> on_response,
+                                    int cmd);
+  // |self| must point at this socket through the shared_ptr that owns it; the
+  // watch keeps only the weak pointer, so releasing the socket ends delivery.
+  virtual bool WatchNetlinkSocket(std::weak_ptr<NlSocket> self,
+                                  const std::function<int(nl_msg*)>& handler);
+  virtual bool StopWatchNetlinkSocket();
+
+ protected:
+  // For Setup() overrides that connect the socket another way.
+  void set_sock(nl_sock* sock);
+  nl_sock* sock() const { return sock_; }
+
+ private:
+  EventLoop* event_loop_;
+  nl_sock* sock_;
+  bool watching_;
+  std::unique_ptr<NlMessageReader> reader_;
+};
+
+}  // namespace dalix
+}  // namespace hardware

@@ -65,9 +65,7 @@ bool LooperBackedEventLoop::WatchFileDescriptor(int fd, ReadyMode mode,
   return true;
 }
 
-bool LooperBackedEventLoop::StopWatchFileDescriptor(int fd) {
-  return looper_->removeFd(fd) == 1;
-}
+bool LooperBackedEventLoop::StopWatchFileDescriptor(int fd) { return looper_->removeFd(fd) == 1; }
 
 void LooperBackedEventLoop::Poll() {
   while (running_) {

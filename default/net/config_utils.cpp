@@ -59,9 +59,8 @@ void ConfigUtils::ParseLine(const std::string& line) {
   if (equals == std::string::npos || equals + 1 == line.size()) return;
   if (comment != std::string::npos && comment < equals) return;
   std::string key = line.substr(0, equals);
-  std::string value = line.substr(equals + 1, comment == std::string::npos
-                                                  ? std::string::npos
-                                                  : comment - equals - 1);
+  std::string value = line.substr(
+      equals + 1, comment == std::string::npos ? std::string::npos : comment - equals - 1);
   trim(&key);
   trim(&value);
   map_[key] = value;

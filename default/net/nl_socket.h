@@ -28,8 +28,7 @@ class NlSocket {
   virtual int Resolve(const char* family);
   virtual bool ReceiveMessage(std::function<int(nl_msg*)> handler);
   virtual bool SendAndAwaitAck(nl_msg* msg, std::function<int(nl_msg*)> on_message);
-  virtual bool SendAndAwaitResponse(nl_msg* msg, std::function<void(nl_msg*)> on_response,
-                                    int cmd);
+  virtual bool SendAndAwaitResponse(nl_msg* msg, std::function<void(nl_msg*)> on_response, int cmd);
   // |self| must point at this socket through the shared_ptr that owns it; the
   // watch keeps only the weak pointer, so releasing the socket ends delivery.
   virtual bool WatchNetlinkSocket(std::weak_ptr<NlSocket> self,

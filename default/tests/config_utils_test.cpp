@@ -53,12 +53,8 @@ TEST(TrimTest, StripsBlanksAndControlWhitespaceAtTheEndsOnly) {
   const struct {
     std::string in, out;
   } cases[] = {
-      {"", ""},
-      {" \t\n\v\f\r", ""},
-      {"  a b  ", "a b"},
-      {"\ta\tb\r", "a\tb"},
-      {"x", "x"},
-      {"\x01x\x0e", "\x01x\x0e"},
+      {"", ""},   {" \t\n\v\f\r", ""},        {"  a b  ", "a b"}, {"\ta\tb\r", "a\tb"},
+      {"x", "x"}, {"\x01x\x0e", "\x01x\x0e"},
   };
   for (const auto& c : cases) {
     std::string s = c.in;

@@ -35,6 +35,15 @@ bool ParseCalibrationValue(const char* text, uint32_t* value) {
   return true;
 }
 
+// Opens a nest whose type word must not carry NLA_F_NESTED: libnl's
+// nla_nest_start always sets the flag, and the driver tells these nests apart
+// by the plain type.
+nlattr* StartPlainNest(nl_msg* msg, int type) {
+  nlattr* nest = nla_nest_start(msg, type);
+  if (nest != nullptr) nest->nla_type &= ~NLA_F_NESTED;
+  return nest;
+}
+
 // Applies a SET_CALIBRATIONS reply to the transfer's |status|.
 void OnCalibrationReply(nl_msg* msg, int* status) {
   nlattr* attrs[MCPS802154_ATTR_MAX + 1] = {};
@@ -166,14 +175,13 @@ bool McpsUtils::SetFiraRegion(uint32_t hw_index) {
   UniqueNlMsg msg;
   if (!SetMcpsCommand(msg.get(), hw_index, MCPS802154_CMD_SET_SCHEDULER, 0)) return false;
 
-  // The driver expects these two nests without NLA_F_NESTED.
   auto put_attributes = [&]() {
     if (nla_put_string(msg.get(), MCPS802154_ATTR_SCHEDULER_NAME, kMcpsSchedulerEndless) != 0) {
       return false;
     }
-    nlattr* regions = nla_nest_start(msg.get(), MCPS802154_ATTR_SCHEDULER_REGIONS);
+    nlattr* regions = StartPlainNest(msg.get(), MCPS802154_ATTR_SCHEDULER_REGIONS);
     if (regions == nullptr) return false;
-    nlattr* region = nla_nest_start(msg.get(), MCPS802154_SCHEDULER_REGIONS_ATTR_REGION);
+    nlattr* region = StartPlainNest(msg.get(), MCPS802154_SCHEDULER_REGIONS_ATTR_REGION);
     if (region == nullptr) return false;
     if (nla_put_string(msg.get(), MCPS802154_REGION_ATTR_NAME, kMcpsRegionFira) != 0) return false;
     return nla_nest_end(msg.get(), region) == 0 && nla_nest_end(msg.get(), regions) == 0;

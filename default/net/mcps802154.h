@@ -173,6 +173,40 @@ constexpr McpsPolicy<MCPS802154_RANGING_RESULT_ATTR_MAX> RangingResultPolicy() {
   return policy;
 }
 
+// What the driver accepts in requests.
+constexpr McpsPolicy<MCPS802154_ATTR_MAX> RequestPolicy() {
+  McpsPolicy<MCPS802154_ATTR_MAX> policy{};
+  policy[MCPS802154_ATTR_HW] = Policy(NLA_U32);
+  policy[MCPS802154_ATTR_SCHEDULER_NAME] = Policy(NLA_STRING, kMcpsNameMaxLen);
+  policy[MCPS802154_ATTR_SCHEDULER_PARAMS] = Policy(NLA_NESTED);
+  policy[MCPS802154_ATTR_SCHEDULER_REGIONS] = Policy(NLA_NESTED);
+  policy[MCPS802154_ATTR_SCHEDULER_REGION_CALL] = Policy(NLA_NESTED);
+  policy[MCPS802154_ATTR_TESTDATA] = Policy(NLA_NESTED);
+  policy[MCPS802154_ATTR_CALIBRATIONS] = Policy(NLA_NESTED);
+  policy[MCPS802154_ATTR_RANGING_REQUESTS] = Policy(NLA_NESTED);
+  return policy;
+}
+
+constexpr McpsPolicy<MCPS802154_SCHEDULER_PARAMS_ATTR_MAX> SchedulerParamsPolicy() {
+  McpsPolicy<MCPS802154_SCHEDULER_PARAMS_ATTR_MAX> policy{};
+  policy[MCPS802154_SCHEDULER_PARAMS_ATTR_SLOT_DURATION] = Policy(NLA_U32, sizeof(uint32_t));
+  policy[MCPS802154_SCHEDULER_PARAMS_ATTR_NODE_TYPE] = Policy(NLA_U32, sizeof(uint32_t));
+  return policy;
+}
+
+constexpr McpsPolicy<MCPS802154_REGION_ATTR_MAX> RegionPolicy() {
+  McpsPolicy<MCPS802154_REGION_ATTR_MAX> policy{};
+  policy[MCPS802154_REGION_ATTR_NAME] = Policy(NLA_STRING, kMcpsNameMaxLen);
+  return policy;
+}
+
+constexpr McpsPolicy<MCPS802154_CALIBRATION_ATTR_MAX> CalibrationRequestPolicy() {
+  McpsPolicy<MCPS802154_CALIBRATION_ATTR_MAX> policy{};
+  policy[MCPS802154_CALIBRATION_ATTR_KEY] = Policy(NLA_STRING);
+  policy[MCPS802154_CALIBRATION_ATTR_VALUE] = Policy(NLA_U32, sizeof(uint32_t));
+  return policy;
+}
+
 }  // namespace mcps_internal
 
 // MCPS802154_CMD_NEW_HW: the hardware index and the two names.
@@ -186,6 +220,17 @@ inline constexpr McpsPolicy<MCPS802154_ATTR_MAX> kMcpsRangingReportPolicy =
 // Inside MCPS802154_ATTR_RANGING_RESULT.
 inline constexpr McpsPolicy<MCPS802154_RANGING_RESULT_ATTR_MAX> kMcpsRangingResultPolicy =
     mcps_internal::RangingResultPolicy();
+
+// The driver's side: what it accepts in requests (top level, scheduler
+// parameters, one region, one calibration element).
+inline constexpr McpsPolicy<MCPS802154_ATTR_MAX> kMcpsRequestPolicy =
+    mcps_internal::RequestPolicy();
+inline constexpr McpsPolicy<MCPS802154_SCHEDULER_PARAMS_ATTR_MAX> kMcpsSchedulerParamsPolicy =
+    mcps_internal::SchedulerParamsPolicy();
+inline constexpr McpsPolicy<MCPS802154_REGION_ATTR_MAX> kMcpsRegionPolicy =
+    mcps_internal::RegionPolicy();
+inline constexpr McpsPolicy<MCPS802154_CALIBRATION_ATTR_MAX> kMcpsCalibrationRequestPolicy =
+    mcps_internal::CalibrationRequestPolicy();
 
 }  // namespace dalix
 }  // namespace hardware

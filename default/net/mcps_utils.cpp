@@ -25,8 +25,10 @@ namespace {
 int CalibrationElementOverhead() { return nla_total_size(0) + nla_total_size(sizeof(uint32_t)); }
 
 // Parses a calibration value as decimal, then as hexadecimal (with or without
-// 0x). Anything else, even with a valid prefix, is refused.
+// 0x). Anything else, even with a valid prefix, is refused; so is an empty
+// value, which would otherwise reach the radio as 0.
 bool ParseCalibrationValue(const char* text, uint32_t* value) {
+  if (*text == '\0') return false;
   char* end = nullptr;
   long parsed = strtol(text, &end, 10);
   if (*end != '\0') parsed = strtol(text, &end, 16);

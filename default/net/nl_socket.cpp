@@ -168,10 +168,10 @@ bool NlSocket::WatchNetlinkSocket(std::weak_ptr<NlSocket> self,
     }
     locked->ReceiveMessage(handler);
   };
-  // Mode 1 on purpose: the loop wakes the socket as writable, and the read
-  // that follows waits for the driver's message within the receive timeout.
-  bool watched = socket->event_loop_->WatchFileDescriptor(fd, static_cast<EventLoop::ReadyMode>(1),
-                                                          callback);
+  // Output (mode 1) on purpose: the loop wakes the socket as writable, and
+  // the read that follows waits for the driver's message within the receive
+  // timeout.
+  bool watched = socket->event_loop_->WatchFileDescriptor(fd, EventLoop::kModeOutput, callback);
   if (watched) socket->watching_ = true;
   return watched;
 }

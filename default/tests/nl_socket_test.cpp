@@ -405,20 +405,6 @@ TEST_F(NlSocketTest, ErrorWithoutErrorHandlerStopsTheRead) {
       << log_.Text();
 }
 
-TEST_F(NlSocketTest, ReceiveMessageHandsOverOneDatagram) {
-  socket_->DisableAutoAck();
-  ASSERT_TRUE(Subscribe(2));
-  std::vector<Seen> events;
-  auto collect = [&events](nl_msg* msg) {
-    events.push_back(Inspect(msg));
-    return NL_OK;
-  };
-  ASSERT_TRUE(socket_->ReceiveMessage(collect));
-  EXPECT_THAT(events, ::testing::ElementsAre(Seen{sim::kTestCmdValue, 1}));
-  ASSERT_TRUE(socket_->ReceiveMessage(collect));
-  EXPECT_EQ(2u, events.size());
-}
-
 // The whole path on the service's real loop: a watched socket's events reach
 // the handler when the loop polls.
 TEST(NlSocketLoopTest, EventsReachTheHandlerThroughTheEventLoop) {

@@ -75,7 +75,7 @@ int main(int argc, char** argv) {
   // The namespace must come before any thread; the benchmark's own output
   // matters here, not the per-message log lines.
   if (!hardware::dalix::sim::EnterPrivateNamespace()) return 1;
-  android::base::SetMinimumLogSeverity(android::base::WARNING);
+  android::base::SetMinimumLogSeverity(android::base::ERROR);
   benchmark::Initialize(&argc, argv);
   if (benchmark::ReportUnrecognizedArguments(argc, argv)) return 1;
   benchmark::RunSpecifiedBenchmarks();

@@ -85,6 +85,20 @@ TEST_F(McpsFamilyTest, ListHardwareOfNoRadioIsEmpty) {
   EXPECT_TRUE(mcps_.ListHardware(&ok).empty());
 }
 
+TEST_F(McpsFamilyTest, MalformedDiscoveryReplyIsDroppedAndTheNextDumpWorks) {
+  radios_.AddRadio(0, 0u);
+  Fault fault;
+  fault.kind = Fault::Kind::kMalformed;
+  fault.count = 1;
+  simulator_.SetCommandFault(kMcpsFamilyName, MCPS802154_CMD_GET_HW, fault);
+  bool ok = false;
+  EXPECT_TRUE(mcps_.ListHardware(&ok).empty());
+  std::vector<McpsHwInfo> found = mcps_.ListHardware(&ok);
+  EXPECT_TRUE(ok);
+  ASSERT_EQ(found.size(), 1u);
+  EXPECT_EQ(found[0].hw_index, 0u);
+}
+
 TEST_F(McpsFamilyTest, GetHardwareInfoReadsOneRadioAndRefusesUnknownIndexes) {
   radios_.AddRadio(4, 2u);
   radios_.SetScheduler(4, kMcpsSchedulerSimpleRanging, 16, 1, {});

@@ -72,10 +72,24 @@ struct Request {
 //     }
 //   };
 //
-//   EchoFamily echo;
-//   DriverSimulator simulator;
+//   EchoFamily echo;             // declared before the simulator, so it
+//   DriverSimulator simulator;   // outlives the simulator's thread
 //   int id = simulator.RegisterFamily("echo", &echo);
 //   simulator.Start();
+//   SimNlSocketFactory factory(&event_loop, simulator.port());
+//   // ... the service's own code, given |factory|, now resolves "echo" and
+//   // talks to EchoFamily.
+//
+// Handlers need no locking of their own as long as only the simulator thread
+// touches their state; a test that wants to change it while the simulator
+// runs does so with DriverSimulator::Post(). Misbehaviour (no answer, an
+// error, a stray reply, a malformed reply, a vanished family) is switched on
+// from outside with DriverSimulator::SetFault() and friends, so families only
+// implement the good path and their own argument checks; anything no builder
+// can make goes out with DriverSimulator::SendRaw().
+//
+// Every program that runs a simulator calls EnterPrivateNamespace() before
+// its first thread; test programs get that from the shared test main.
 class FamilyHandler {
  public:
   virtual ~FamilyHandler() = default;

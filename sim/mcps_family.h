@@ -1,0 +1,40 @@
+#pragma once
+
+#include <atomic>
+#include <cstdint>
+
+#include "sim/family_handler.h"
+#include "sim/radio_store.h"
+#include "sim/responder.h"
+
+namespace hardware {
+namespace dalix {
+namespace sim {
+
+// The simulated UWB MAC driver's "mcps802154" family: radio discovery,
+// scheduler and region selection, and calibration, served from a RadioStore.
+// Requests are checked as strictly as the driver checks them. Runs on the
+// simulator thread; SetMaxPayload may be called from any thread.
+class McpsFamily : public FamilyHandler {
+ public:
+  explicit McpsFamily(RadioStore* radios);
+
+  void HandleRequest(const Request& request, Responder& responder) override;
+
+  // Requests whose netlink payload exceeds |bytes| are refused with EMSGSIZE,
+  // as the kernel refuses a message larger than a page. Defaults to a page
+  // less the netlink header.
+  void SetMaxPayload(int bytes) { max_payload_ = bytes; }
+
+ private:
+  void GetHw(const Request& request, nlattr** attrs, Responder& responder);
+  void SetScheduler(const Request& request, nlattr** attrs, Responder& responder);
+  void SetCalibrations(nlattr** attrs, Responder& responder);
+
+  RadioStore* radios_;
+  std::atomic<int> max_payload_;
+};
+
+}  // namespace sim
+}  // namespace dalix
+}  // namespace hardware

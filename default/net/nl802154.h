@@ -82,6 +82,8 @@ inline const Nl802154CapabilityPolicy& Nl802154CapabilityAttributePolicy() {
   static const Nl802154CapabilityPolicy policy = [] {
     Nl802154CapabilityPolicy p{};
     p[NL802154_CAP_ATTR_CHANNELS].type = NLA_NESTED;
+    // The kernel lists every page, so a list too short for one is broken.
+    p[NL802154_CAP_ATTR_CHANNELS].minlen = NLA_HDRLEN;
     return p;
   }();
   return policy;

@@ -109,6 +109,9 @@ UniqueNlMsg InterfaceReply(const char* name, int64_t phy) {
   return msg;
 }
 
+// libnl drops a nest that ends up empty, so empty nests are put directly.
+void PutEmptyNest(nl_msg* msg, int type) { nla_put(msg, type, 0, nullptr); }
+
 using Pages = std::vector<std::pair<int, std::vector<int>>>;
 
 UniqueNlMsg PhyReply(uint32_t phy, const Pages& pages) {
@@ -117,6 +120,10 @@ UniqueNlMsg PhyReply(uint32_t phy, const Pages& pages) {
   nlattr* caps = nla_nest_start(msg.get(), NL802154_ATTR_WPAN_PHY_CAPS);
   nlattr* channels = nla_nest_start(msg.get(), NL802154_CAP_ATTR_CHANNELS);
   for (const auto& [page, page_channels] : pages) {
+    if (page_channels.empty()) {
+      PutEmptyNest(msg.get(), page);
+      continue;
+    }
     nlattr* nest = nla_nest_start(msg.get(), page);
     for (int channel : page_channels) nla_put_flag(msg.get(), channel);
     nla_nest_end(msg.get(), nest);
@@ -335,7 +342,8 @@ TEST_F(IeeeUtilsTest, GetPhyInfoReadsOnlyTheUwbPageAndAppends) {
     EXPECT_EQ(kIfindex, sent.Payload(NL802154_ATTR_IFINDEX));
     EXPECT_EQ(NL802154_CMD_NEW_WPAN_PHY, reply_cmd);
   }
-  EXPECT_TRUE(log_.Entries().size() == 3u) << log_.Text();  // "GetPhyInfo" only
+  EXPECT_EQ(3, log_.Count(android::base::INFO, "GetPhyInfo", kTag));
+  EXPECT_EQ(3u, log_.Entries().size()) << log_.Text();
 }
 
 TEST_F(IeeeUtilsTest, GetPhyInfoFailsOnIncompleteReplies) {
@@ -343,11 +351,11 @@ TEST_F(IeeeUtilsTest, GetPhyInfoFailsOnIncompleteReplies) {
   nla_put_u32(no_caps.get(), NL802154_ATTR_WPAN_PHY, 1);
 
   UniqueNlMsg no_phy = NewReply(NL802154_CMD_NEW_WPAN_PHY);
-  nla_nest_end(no_phy.get(), nla_nest_start(no_phy.get(), NL802154_ATTR_WPAN_PHY_CAPS));
+  PutEmptyNest(no_phy.get(), NL802154_ATTR_WPAN_PHY_CAPS);
 
   UniqueNlMsg no_channels = NewReply(NL802154_CMD_NEW_WPAN_PHY);
   nla_put_u32(no_channels.get(), NL802154_ATTR_WPAN_PHY, 1);
-  nla_nest_end(no_channels.get(), nla_nest_start(no_channels.get(), NL802154_ATTR_WPAN_PHY_CAPS));
+  PutEmptyNest(no_channels.get(), NL802154_ATTR_WPAN_PHY_CAPS);
 
   UniqueNlMsg bad_caps = NewReply(NL802154_CMD_NEW_WPAN_PHY);
   nla_put_u32(bad_caps.get(), NL802154_ATTR_WPAN_PHY, 1);

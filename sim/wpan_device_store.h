@@ -1,5 +1,10 @@
 #pragma once
 
+// WpanDeviceStore: the simulated driver's 802.15.4 interfaces, each backed by
+// a veth of its name in the process's network namespace. Tests configure and
+// inspect it from their thread while the simulator thread serves requests
+// from it, so every access is guarded and state is handed out by copy.
+
 #include <stdint.h>
 
 #include <map>
@@ -47,10 +52,6 @@ struct WpanDevice {
   bool up = false;
 };
 
-// The simulated driver's 802.15.4 interfaces, each backed by a veth of its
-// name in the process's network namespace. Tests configure and inspect it
-// from their thread while the simulator thread serves requests from it, so
-// every access is guarded and state is handed out by copy.
 class WpanDeviceStore {
  public:
   WpanDeviceStore() = default;

@@ -1,5 +1,10 @@
 #pragma once
 
+// IeeeUtils: client of the kernel's "nl802154" family. Lists the 802.15.4
+// interfaces, reads a phy's UWB channels and sets an interface's PAN id,
+// channel and short address. Runs on the service thread; each request blocks
+// it until the kernel answers, on a socket of its own.
+
 #include <stdint.h>
 
 #include <string>
@@ -24,10 +29,6 @@ struct PhyInfo {
   std::vector<int> channels;
 };
 
-// Client of the kernel's "nl802154" family: lists the 802.15.4 interfaces,
-// reads a phy's UWB channels and sets an interface's PAN id, channel and
-// short address. Each request blocks the service thread until the kernel
-// answers, on a socket of its own.
 class IeeeUtils {
  public:
   explicit IeeeUtils(NlSocketFactory* factory) : factory_(factory) {}

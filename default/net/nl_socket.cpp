@@ -37,6 +37,8 @@ bool NlSocket::Setup() {
     LOG(ERROR) << "Setup: Failed to create netlink socket";
     return false;
   }
+  // Before the connect there is no descriptor yet, so libnl refuses this and
+  // the connect applies its own default; kept in this order on purpose.
   nl_socket_set_buffer_size(sock_, kBufferBytes, kBufferBytes);
   if (genl_connect(sock_) != 0) {
     LOG(ERROR) << "Setup: Failed to connect to generic netlink";

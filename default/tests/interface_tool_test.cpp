@@ -143,7 +143,9 @@ class InterfaceToolKernelTest : public InterfaceToolTest {
       GTEST_SKIP() << "cannot create a network namespace: " << strerror(errno);
     }
     tun_.reset(open("/dev/net/tun", O_RDWR | O_CLOEXEC));
-    if (tun_.get() < 0) GTEST_SKIP() << "/dev/net/tun unavailable: " << strerror(errno);
+    if (tun_.get() < 0) {
+      GTEST_SKIP() << "needs root: /dev/net/tun cannot be opened (" << strerror(errno) << ")";
+    }
     ifreq ifr{};
     ifr.ifr_flags = IFF_TAP | IFF_NO_PI;
     memcpy(ifr.ifr_name, kTapName, sizeof(kTapName));

@@ -32,9 +32,12 @@ std::shared_ptr<ICInterface> GetLocalObject(const AIBinder* binder);
 // dead or the queue was reset before the call ran.
 binder_status_t Transact(AIBinder* binder, const std::function<void()>& call);
 
-// Harness: the process behind |binder| dies. The binder stops answering,
-// AIBinder_isAlive turns false, and each of its death links is queued for
-// the service thread. Killing a dead binder does nothing.
+// Harness: the process behind |binder| dies. The binder stops answering new
+// calls (calls already queued still run), AIBinder_isAlive turns false, and
+// each of its death links is queued for the service thread. Killing a dead
+// binder does nothing. Hold a reference to the binder for as long as the
+// death matters: once its last reference is gone, the object's next
+// asBinder() makes a new, living binder.
 void KillBinder(AIBinder* binder);
 
 // Harness: forgets registered services, fails queued calls with

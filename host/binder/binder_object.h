@@ -2,14 +2,18 @@
 
 #include <atomic>
 #include <memory>
+#include <mutex>
 
 #include <android/binder_ibinder.h>
 #include <android/binder_interface_utils.h>
 
 // One binder of the emulation: a local object and the counts that keep it.
 // Strong references keep |object|; weak references (which all strong ones
-// hold together as one) keep the memory, so that a weak reference can still
-// ask whether the binder may be promoted.
+// hold together as one, while |object| is set) keep the memory, so that a
+// weak reference can still ask whether the binder may be promoted. The
+// object's own weak reference lets it take its binder back to life when the
+// strong count went to zero, so that a living object keeps one binder, with
+// its death state and links, for its whole life.
 struct AIBinder {
   AIBinder(const char* descriptor_in, std::shared_ptr<ndk::ICInterface> object_in)
       : descriptor(descriptor_in), object(std::move(object_in)) {}
@@ -20,6 +24,8 @@ struct AIBinder {
   // Set while |strong| is above zero, released with the last strong reference.
   std::shared_ptr<ndk::ICInterface> object;
   std::atomic<bool> alive{true};
+  // Serializes handing |object| over when the strong count passes zero.
+  std::mutex object_mutex;
 };
 
 namespace ndk {

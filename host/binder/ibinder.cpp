@@ -36,6 +36,25 @@ SpAIBinder NewLocalBinder(const char* descriptor, std::shared_ptr<ICInterface> o
   return SpAIBinder(new AIBinder(descriptor, std::move(object)));
 }
 
+SpAIBinder ReviveLocalBinder(AIBinder_Weak* weak_binder, std::shared_ptr<ICInterface> object) {
+  if (weak_binder == nullptr || object == nullptr) return nullptr;
+  AIBinder* binder = weak_binder->binder;
+  std::lock_guard<std::mutex> lock(binder->object_mutex);
+  if (binder->strong.load(std::memory_order_acquire) > 0) {
+    // Another thread revived it first.
+    binder->strong.fetch_add(1, std::memory_order_relaxed);
+    return SpAIBinder(binder);
+  }
+  if (binder->object == nullptr) {
+    binder->object = std::move(object);
+    internal::IncWeak(binder);
+  }
+  // Else a releasing thread has not taken the object yet; it will find the
+  // count above zero and leave both the object and the weak reference.
+  binder->strong.store(1, std::memory_order_release);
+  return SpAIBinder(binder);
+}
+
 const char* GetDescriptor(const AIBinder* binder) {
   return binder != nullptr ? binder->descriptor : nullptr;
 }
@@ -61,13 +80,19 @@ void AIBinder_incStrong(AIBinder* binder) {
 
 void AIBinder_decStrong(AIBinder* binder) {
   if (binder == nullptr) return;
-  if (binder->strong.fetch_sub(1, std::memory_order_acq_rel) == 1) {
-    // Nobody can promote any more, so the object is ours to release; its
-    // destructor may drop further references, to this binder's memory too.
-    std::shared_ptr<ndk::ICInterface> object = std::move(binder->object);
-    object.reset();
-    ndk::host::internal::DecWeak(binder);
+  if (binder->strong.fetch_sub(1, std::memory_order_acq_rel) != 1) return;
+  // Unless the object revived its binder meanwhile, the object is ours to
+  // release, together with the weak reference that all strong ones held.
+  std::shared_ptr<ndk::ICInterface> object;
+  {
+    std::lock_guard<std::mutex> lock(binder->object_mutex);
+    if (binder->strong.load(std::memory_order_acquire) == 0) object = std::move(binder->object);
   }
+  if (object == nullptr) return;
+  // Released outside the lock: the object's destructor may drop further
+  // references, to this binder's memory too.
+  object.reset();
+  ndk::host::internal::DecWeak(binder);
 }
 
 int32_t AIBinder_debugGetRefCount(AIBinder* binder) {

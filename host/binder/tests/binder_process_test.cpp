@@ -4,6 +4,7 @@
 #include <memory>
 #include <string>
 #include <thread>
+#include <vector>
 
 #include <android/binder_auto_utils.h>
 #include <android/binder_ibinder.h>
@@ -90,6 +91,27 @@ TEST_F(BinderProcessTest, ClientCallWaitsForThePollingThread) {
   EXPECT_EQ(std::this_thread::get_id(), ran_on);
   EXPECT_EQ(STATUS_OK, result);
   EXPECT_FALSE(Readable(fd_, 0));
+}
+
+TEST_F(BinderProcessTest, ManyClientsAreServedOneCallAtATime) {
+  constexpr int kClients = 4;
+  constexpr int kCallsEach = 50;
+  int total = 0;  // touched only by the calls, which all run on this thread
+  std::atomic<int> finished{0};
+  std::vector<std::thread> clients;
+  for (int i = 0; i < kClients; ++i) {
+    clients.emplace_back([&] {
+      for (int n = 0; n < kCallsEach; ++n) {
+        EXPECT_EQ(STATUS_OK, ndk::host::Transact(binder_.get(), [&] { ++total; }));
+      }
+      ++finished;
+    });
+  }
+  while (finished < kClients) {
+    if (Readable(fd_, 20)) ABinderProcess_handlePolledCommands();
+  }
+  for (std::thread& client : clients) client.join();
+  EXPECT_EQ(kClients * kCallsEach, total);
 }
 
 TEST_F(BinderProcessTest, CallsOnTheServiceThreadRunAtOnce) {
@@ -230,6 +252,26 @@ TEST_F(BinderProcessTest, BinderKeepsItsObjectAndStaysTheSameWhileHeld) {
   binder.set(nullptr);
   EXPECT_TRUE(destroyed);
   EXPECT_EQ(nullptr, weak.promote().get());
+}
+
+TEST_F(BinderProcessTest, LivingObjectKeepsItsBinderWithDeathStateAndLinks) {
+  // Service code links to a client object's binder without keeping the
+  // binder; a later kill of that object's binder must still reach the link.
+  auto thing = ndk::SharedRefBase::make<Thing>();
+  ndk::ScopedAIBinder_DeathRecipient recipient(AIBinder_DeathRecipient_new(RecordDeath));
+  DeathRecord record;
+  AIBinder* first = thing->asBinder().get();
+  ASSERT_EQ(STATUS_OK, AIBinder_linkToDeath(thing->asBinder().get(), recipient.get(), &record));
+
+  ndk::SpAIBinder again = thing->asBinder();
+  EXPECT_EQ(first, again.get());
+  EXPECT_EQ(1, AIBinder_debugGetRefCount(again.get()));
+  ndk::host::KillBinder(again.get());
+  again.set(nullptr);
+  EXPECT_FALSE(AIBinder_isAlive(thing->asBinder().get()));
+  EXPECT_EQ(thing, ndk::host::GetLocalObject(thing->asBinder().get()));
+  ABinderProcess_handlePolledCommands();
+  EXPECT_EQ(1, record.calls);
 }
 
 TEST_F(BinderProcessTest, ServiceManagerFindsWhatWasAdded) {

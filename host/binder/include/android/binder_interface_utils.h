@@ -43,6 +43,15 @@ class SharedRefBase {
   std::weak_ptr<SharedRefBase> this_;
 };
 
+class ICInterface;
+
+namespace host {
+// The binder that |weak_binder| names, back in service for |object| when its
+// strong references had all gone; null when it cannot be. Used only by
+// BnCInterface below.
+SpAIBinder ReviveLocalBinder(AIBinder_Weak* weak_binder, std::shared_ptr<ICInterface> object);
+}  // namespace host
+
 // What every generated interface derives from.
 class ICInterface : public SharedRefBase {
  public:
@@ -56,13 +65,17 @@ class ICInterface : public SharedRefBase {
 };
 
 // The implementation side of interface INTERFACE. Its binder is created on
-// first use and keeps the object alive while the binder is referenced.
+// first use, keeps the object alive while the binder is referenced, and stays
+// the same binder for as long as the object lives.
 template <typename INTERFACE>
 class BnCInterface : public INTERFACE {
  public:
   SpAIBinder asBinder() override {
     std::lock_guard<std::mutex> lock(binder_mutex_);
     SpAIBinder binder = weak_binder_.promote();
+    if (binder.get() == nullptr && weak_binder_.get() != nullptr) {
+      binder = host::ReviveLocalBinder(weak_binder_.get(), this->template ref<ICInterface>());
+    }
     if (binder.get() == nullptr) {
       binder = createBinder();
       weak_binder_.set(AIBinder_Weak_new(binder.get()));

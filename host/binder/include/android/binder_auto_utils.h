@@ -3,7 +3,10 @@
 // Owning C++ wrappers around the binder C objects of the host emulation,
 // with the platform's names and member functions.
 
+#include <android/binder_ibinder.h>
 #include <android/binder_status.h>
+
+#include <cstddef>
 
 #include <string>
 #include <utility>
@@ -47,6 +50,73 @@ class ScopedAResource {
 };
 
 }  // namespace impl
+
+// Strong reference to a binder. Copies share the binder; thread-safe as the
+// binder's reference count is.
+class SpAIBinder {
+ public:
+  SpAIBinder() = default;
+  SpAIBinder(std::nullptr_t) {}  // NOLINT: converts like a pointer.
+  // Adopts a reference that the caller already holds.
+  explicit SpAIBinder(AIBinder* binder) : binder_(binder) {}
+  SpAIBinder(const SpAIBinder& other) : binder_(other.binder_) {
+    if (binder_ != nullptr) AIBinder_incStrong(binder_);
+  }
+  SpAIBinder(SpAIBinder&& other) noexcept : binder_(other.release()) {}
+  ~SpAIBinder() { set(nullptr); }
+
+  SpAIBinder& operator=(const SpAIBinder& other) {
+    if (other.binder_ != nullptr) AIBinder_incStrong(other.binder_);
+    set(other.binder_);
+    return *this;
+  }
+  SpAIBinder& operator=(SpAIBinder&& other) noexcept {
+    if (this != &other) set(other.release());
+    return *this;
+  }
+
+  // Adopts |binder|, dropping the reference held before.
+  void set(AIBinder* binder) {
+    AIBinder* old = binder_;
+    binder_ = binder;
+    if (old != nullptr) AIBinder_decStrong(old);
+  }
+  AIBinder* get() const { return binder_; }
+  AIBinder* release() {
+    AIBinder* held = binder_;
+    binder_ = nullptr;
+    return held;
+  }
+  AIBinder** getR() { return &binder_; }
+
+  bool operator==(const SpAIBinder& other) const { return binder_ == other.binder_; }
+  bool operator!=(const SpAIBinder& other) const { return binder_ != other.binder_; }
+  bool operator<(const SpAIBinder& other) const { return binder_ < other.binder_; }
+
+ private:
+  AIBinder* binder_ = nullptr;
+};
+
+class ScopedAIBinder_Weak
+    : public impl::ScopedAResource<AIBinder_Weak*, AIBinder_Weak_delete, nullptr> {
+ public:
+  explicit ScopedAIBinder_Weak(AIBinder_Weak* weak = nullptr) : ScopedAResource(weak) {}
+  ScopedAIBinder_Weak(ScopedAIBinder_Weak&&) = default;
+  ScopedAIBinder_Weak& operator=(ScopedAIBinder_Weak&&) = default;
+
+  // Null once the binder's last strong reference is gone.
+  SpAIBinder promote() const { return SpAIBinder(AIBinder_Weak_promote(get())); }
+};
+
+class ScopedAIBinder_DeathRecipient
+    : public impl::ScopedAResource<AIBinder_DeathRecipient*, AIBinder_DeathRecipient_delete,
+                                   nullptr> {
+ public:
+  explicit ScopedAIBinder_DeathRecipient(AIBinder_DeathRecipient* recipient = nullptr)
+      : ScopedAResource(recipient) {}
+  ScopedAIBinder_DeathRecipient(ScopedAIBinder_DeathRecipient&&) = default;
+  ScopedAIBinder_DeathRecipient& operator=(ScopedAIBinder_DeathRecipient&&) = default;
+};
 
 // The status that every interface operation returns. An empty object (as
 // left by a move) is not OK, and reads as a failed transaction carrying

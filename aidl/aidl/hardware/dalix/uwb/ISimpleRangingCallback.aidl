@@ -1,0 +1,6 @@
+package aidl.hardware.dalix.uwb;
+
+@VintfStability
+interface ISimpleRangingCallback {
+    void onRangingResult(in RangingResult result);
+}

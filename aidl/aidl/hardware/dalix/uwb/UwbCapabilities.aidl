@@ -1,0 +1,6 @@
+package aidl.hardware.dalix.uwb;
+
+@VintfStability
+parcelable UwbCapabilities {
+    int[] supportedChannels;
+}

@@ -1,0 +1,29 @@
+#pragma once
+
+// Process-wide binder settings and the polled command interface of the host
+// binder emulation, under the platform header's names.
+
+#include <stdbool.h>
+#include <stdint.h>
+
+#include <android/binder_status.h>
+
+#ifdef __cplusplus
+extern "C" {
+#endif
+
+// Recorded only: the emulation never starts binder threads.
+bool ABinderProcess_setThreadPoolMaxThreadCount(uint32_t num_threads);
+
+// Gives the descriptor (an eventfd) that turns readable while commands wait
+// for ABinderProcess_handlePolledCommands. The calling thread becomes the
+// service thread: proxy calls made on it run directly.
+binder_status_t ABinderProcess_setupPolling(int* fd);
+
+// Runs the calls and death notifications queued so far, on the calling
+// thread, and returns STATUS_OK.
+binder_status_t ABinderProcess_handlePolledCommands(void);
+
+#ifdef __cplusplus
+}  // extern "C"
+#endif

@@ -79,19 +79,6 @@ TEST_F(LooperBackedEventLoopTest, WatchStopAndWatchAgain) {
   EXPECT_EQ((std::vector<std::string>{"first", "second"}), calls);
 }
 
-TEST_F(LooperBackedEventLoopTest, WatchingAgainReplacesTheCallback) {
-  int first = 0;
-  int second = 0;
-  ASSERT_TRUE(loop_.WatchFileDescriptor(read_end_.get(), EventLoop::kModeInput,
-                                        [&](int fd) { ReadOneByte(fd), ++first; }));
-  ASSERT_TRUE(loop_.WatchFileDescriptor(read_end_.get(), EventLoop::kModeInput,
-                                        [&](int fd) { ReadOneByte(fd), ++second; }));
-  WriteBytes(1);
-  PollOnce(1000);
-  EXPECT_EQ(0, first);
-  EXPECT_EQ(1, second);
-}
-
 TEST_F(LooperBackedEventLoopTest, CallbackStaysRegisteredAcrossCalls) {
   int calls = 0;
   ASSERT_TRUE(loop_.WatchFileDescriptor(read_end_.get(), EventLoop::kModeInput, [&](int fd) {

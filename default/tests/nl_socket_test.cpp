@@ -126,6 +126,8 @@ struct Answer {
   bool ack_only = false;  // the response exchange would wait for data until it times out
 };
 
+void PrintTo(const Answer& answer, std::ostream* os) { *os << answer.name; }
+
 const Seen kValue{sim::kTestCmdValue, 42};
 const std::string kReadError = "Error reading message: ";
 

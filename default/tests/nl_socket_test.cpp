@@ -5,6 +5,8 @@
 #include <cstdint>
 #include <memory>
 #include <string>
+#include <tuple>
+#include <utility>
 #include <vector>
 
 #include <gmock/gmock.h>
@@ -13,7 +15,6 @@
 #include <netlink/genl/genl.h>
 #include <netlink/socket.h>
 
-#include "looper/looper_backed_event_loop.h"
 #include "net/unique_nl_msg.h"
 #include "sim/driver_simulator.h"
 #include "sim/fault.h"
@@ -22,6 +23,7 @@
 #include "sim/test_family.h"
 #include "sim/test_family_defs.h"
 #include "tests/log_capture.h"
+#include "tests/mock_event_loop.h"
 
 namespace hardware {
 namespace dalix {
@@ -29,24 +31,18 @@ namespace {
 
 using android::base::INFO;
 using android::base::WARNING;
+using sim::Fault;
 using ::testing::_;
 using ::testing::DoAll;
+using ::testing::ElementsAre;
 using ::testing::Return;
 using ::testing::SaveArg;
 using ::testing::StrictMock;
 
 constexpr char kTag[] = "dalix.uwb.NlSocket";
 
-class MockEventLoop : public EventLoop {
- public:
-  MOCK_METHOD(void, PostTask, (const std::function<void()>& task), (override));
-  MOCK_METHOD(bool, WatchFileDescriptor,
-              (int fd, ReadyMode mode, const std::function<void(int)>& callback), (override));
-  MOCK_METHOD(bool, StopWatchFileDescriptor, (int fd), (override));
-};
-
-// The production socket, connected to the simulator, with its descriptor and
-// port in view so that the tests can address it and match the watch.
+// The production socket connected to the simulator, with its descriptor and
+// port in view so that the tests can match the watch and address it.
 class TestSocket : public sim::SimNlSocket {
  public:
   explicit TestSocket(EventLoop* event_loop)
@@ -55,20 +51,8 @@ class TestSocket : public sim::SimNlSocket {
   uint32_t port() const { return nl_socket_get_local_port(sock()); }
 };
 
-UniqueNlMsg TestRequest(int family_id, uint8_t cmd) {
-  UniqueNlMsg msg;
-  genlmsg_put(msg.get(), NL_AUTO_PORT, NL_AUTO_SEQ, family_id, 0, 0, cmd,
-              sim::kTestFamilyVersion);
-  return msg;
-}
-
-// What a handler saw of one test-family message: its command and value
-// (0 when it carries none).
-struct Seen {
-  int cmd;
-  uint32_t value;
-  bool operator==(const Seen& other) const { return cmd == other.cmd && value == other.value; }
-};
+// A test-family message as a handler saw it: command, value (0 when none).
+using Seen = std::pair<int, uint32_t>;
 
 Seen Inspect(nl_msg* msg) {
   nlattr* attrs[sim::kTestAttrMax + 1];
@@ -80,10 +64,6 @@ Seen Inspect(nl_msg* msg) {
   return {genlmsg_hdr(nlmsg_hdr(msg))->cmd, value};
 }
 
-void PrintTo(const Seen& seen, std::ostream* os) {
-  *os << "{cmd " << seen.cmd << ", value " << seen.value << "}";
-}
-
 class NlSocketTest : public ::testing::Test {
  protected:
   void SetUp() override {
@@ -93,27 +73,22 @@ class NlSocketTest : public ::testing::Test {
     ASSERT_TRUE(socket_->Setup());
   }
 
-  // Stores |value| in the family through a one-shot exchange of its own.
-  void StoreValue(uint32_t value) {
-    UniqueNlMsg set = TestRequest(family_id_, sim::kTestCmdSet);
-    nla_put_u32(set.get(), sim::kTestAttrValue, value);
-    ASSERT_TRUE(factory_.SendAndAwaitAck(set.get()));
-    log_.Reset();
+  // A test-family request, with |attr| set to |value| unless it is 0.
+  UniqueNlMsg Request(uint8_t cmd, int attr = 0, uint32_t value = 0) {
+    UniqueNlMsg msg;
+    genlmsg_put(msg.get(), NL_AUTO_PORT, NL_AUTO_SEQ, family_id_, 0, 0, cmd,
+                sim::kTestFamilyVersion);
+    if (attr != 0) nla_put_u32(msg.get(), attr, value);
+    return msg;
   }
 
-  void SetFault(sim::Fault::Kind kind, int error = 0, uint8_t other_command = 0) {
-    sim::Fault fault;
-    fault.kind = kind;
-    fault.error = error;
-    fault.other_command = other_command;
-    simulator_.SetFault(sim::kTestFamilyName, fault);
-  }
-
-  // Has the family send |count| events to |socket_| once it has acknowledged.
-  bool Subscribe(uint32_t count) {
-    UniqueNlMsg subscribe = TestRequest(family_id_, sim::kTestCmdSubscribe);
-    nla_put_u32(subscribe.get(), sim::kTestAttrCount, count);
-    return socket_->SendAndAwaitAck(subscribe.get(), nullptr);
+  // Lets the loop watch |socket_| (mode 1, exactly) and keeps its callback;
+  // the socket's destructor stops the watch.
+  void ExpectWatch() {
+    EXPECT_CALL(event_loop_,
+                WatchFileDescriptor(socket_->fd(), static_cast<EventLoop::ReadyMode>(1), _))
+        .WillOnce(DoAll(SaveArg<2>(&wake_), Return(true)));
+    EXPECT_CALL(event_loop_, StopWatchFileDescriptor(socket_->fd())).WillOnce(Return(true));
   }
 
   std::vector<std::string> Lines(android::base::LogSeverity severity) const {
@@ -131,144 +106,107 @@ class NlSocketTest : public ::testing::Test {
   StrictMock<MockEventLoop> event_loop_;
   sim::SimNlSocketFactory factory_{&event_loop_, sim::DriverSimulator::kDefaultPort};
   std::shared_ptr<TestSocket> socket_;
+  std::function<void(int)> wake_;
+  std::vector<Seen> handed_;
+  std::function<int(nl_msg*)> record_ = [this](nl_msg* msg) {
+    handed_.push_back(Inspect(msg));
+    return NL_OK;
+  };
 };
 
-// Both exchanges against the same answers: the request asks for the stored
-// value, which the family sends as one kTestCmdValue reply.
-enum class Exchange { kAck, kResponse };
-
-struct ExchangeOutcome {
+// One answer of the simulator to a get of the stored value 42, and what each
+// exchange makes of it. Log lines lack their "<exchange>: " prefix.
+struct Answer {
+  const char* name;
+  Fault fault;
+  bool stop_simulator;
   bool result;
-  std::vector<Seen> handed;
+  std::vector<Seen> ack_handed, response_handed;
+  std::vector<std::string> warnings, ack_info, response_info;
+  bool ack_only = false;  // the response exchange would wait for data until it times out
 };
+
+void PrintTo(const Answer& answer, std::ostream* os) { *os << answer.name; }
+
+const Seen kValue{sim::kTestCmdValue, 42};
+const std::string kReadError = "Error reading message: ";
+
+// clang-format off
+const Answer kAnswers[] = {
+    {"Clean", {}, false, true, {kValue}, {kValue}, {}, {"Received ACK"}, {"Read message"}},
+    {"AckWithoutData", {Fault::Kind::kAckOnly}, false, true, {}, {}, {}, {"Received ACK"}, {},
+     true},
+    // False after one read: the error ends the read that carried it.
+    {"Error", {Fault::Kind::kError, EBUSY}, false, false, {}, {},
+     {"Nl error: " + std::to_string(-EBUSY), kReadError + nl_geterror(-nl_syserr2nlerr(EBUSY))}, {}, {"Read message"}},
+    // The acknowledge exchange hands every data message on; the response
+    // exchange logs and skips the other command.
+    {"OtherCommandFirst", {Fault::Kind::kOtherCommandFirst, 0, sim::kTestCmdList}, false, true,
+     {{sim::kTestCmdList, 0}, kValue}, {kValue}, {}, {"Received ACK"},
+     {"Read message", "Incorrect received command, got 4 instead of 3", "Read message"}},
+    {"NoAnswer", {Fault::Kind::kNoAnswer}, false, false, {}, {},
+     {kReadError + nl_geterror(-NLE_AGAIN)}, {}, {"Read message"}},
+    {"FailedSend", {}, true, false, {}, {},
+     {std::string("Error sending netlink message: ") + nl_geterror(-nl_syserr2nlerr(ECONNREFUSED))},
+     {}, {}},
+};
+// clang-format on
+
+std::vector<std::tuple<bool, Answer>> Exchanges() {
+  std::vector<std::tuple<bool, Answer>> exchanges;
+  for (const Answer& answer : kAnswers) {
+    exchanges.emplace_back(true, answer);
+    if (!answer.ack_only) exchanges.emplace_back(false, answer);
+  }
+  return exchanges;
+}
 
 class NlSocketExchangeTest : public NlSocketTest,
-                             public ::testing::WithParamInterface<Exchange> {
- protected:
-  const char* Operation() const {
-    return GetParam() == Exchange::kAck ? "SendAndAwaitAck" : "SendAndAwaitResponse";
-  }
+                             public ::testing::WithParamInterface<std::tuple<bool, Answer>> {};
 
-  ExchangeOutcome Run() {
-    UniqueNlMsg get = TestRequest(family_id_, sim::kTestCmdGet);
-    ExchangeOutcome outcome;
-    if (GetParam() == Exchange::kAck) {
-      outcome.result = socket_->SendAndAwaitAck(get.get(), [&outcome](nl_msg* msg) {
-        outcome.handed.push_back(Inspect(msg));
-        return NL_OK;
-      });
-    } else {
-      outcome.result = socket_->SendAndAwaitResponse(
-          get.get(), [&outcome](nl_msg* msg) { outcome.handed.push_back(Inspect(msg)); },
-          sim::kTestCmdValue);
-    }
-    return outcome;
-  }
+TEST_P(NlSocketExchangeTest, HandlesTheAnswer) {
+  const bool ack = std::get<0>(GetParam());
+  const Answer& answer = std::get<1>(GetParam());
+  UniqueNlMsg set = Request(sim::kTestCmdSet, sim::kTestAttrValue, 42);
+  ASSERT_TRUE(factory_.SendAndAwaitAck(set.get()));
+  simulator_.SetFault(sim::kTestFamilyName, answer.fault);
+  if (answer.stop_simulator) simulator_.Stop();
+  log_.Reset();
 
-  int ReadsLogged() const {
-    return log_.Count(INFO, "SendAndAwaitResponse: Read message", kTag);
-  }
-};
+  UniqueNlMsg get = Request(sim::kTestCmdGet);
+  bool result = ack ? socket_->SendAndAwaitAck(get.get(), record_)
+                    : socket_->SendAndAwaitResponse(get.get(), record_, sim::kTestCmdValue);
 
-TEST_P(NlSocketExchangeTest, CleanAnswer) {
-  StoreValue(42);
-  ExchangeOutcome outcome = Run();
-  EXPECT_TRUE(outcome.result);
-  EXPECT_THAT(outcome.handed, ::testing::ElementsAre(Seen{sim::kTestCmdValue, 42}));
-  EXPECT_TRUE(Lines(WARNING).empty()) << log_.Text();
-  if (GetParam() == Exchange::kAck) {
-    EXPECT_EQ(1, log_.Count(INFO, "SendAndAwaitAck: Received ACK", kTag));
-  } else {
-    EXPECT_EQ(1, log_.Count(INFO, "SendAndAwaitResponse", kTag));
-    EXPECT_EQ(1, ReadsLogged());
-  }
+  const std::string op = ack ? "SendAndAwaitAck" : "SendAndAwaitResponse";
+  auto prefixed = [&op](const std::vector<std::string>& lines) {
+    std::vector<std::string> out;
+    for (const std::string& line : lines) out.push_back(op + ": " + line);
+    return out;
+  };
+  std::vector<std::string> info = prefixed(ack ? answer.ack_info : answer.response_info);
+  if (!ack) info.insert(info.begin(), op);
+  EXPECT_EQ(answer.result, result);
+  EXPECT_EQ(ack ? answer.ack_handed : answer.response_handed, handed_);
+  EXPECT_EQ(prefixed(answer.warnings), Lines(WARNING)) << log_.Text();
+  EXPECT_EQ(info, Lines(INFO)) << log_.Text();
 }
 
-TEST_P(NlSocketExchangeTest, ErrorAnswerFailsAfterOneRead) {
-  SetFault(sim::Fault::Kind::kError, EBUSY);
-  ExchangeOutcome outcome = Run();
-  EXPECT_FALSE(outcome.result);
-  EXPECT_TRUE(outcome.handed.empty());
-  std::string op = Operation();
-  // The error ends the read that carried it, and nothing is read after it.
-  EXPECT_THAT(Lines(WARNING),
-              ::testing::ElementsAre(op + ": Nl error: -16",
-                                     op + ": Error reading message: " +
-                                         nl_geterror(-nl_syserr2nlerr(EBUSY))))
-      << log_.Text();
-  if (GetParam() == Exchange::kResponse) {
-    EXPECT_EQ(1, ReadsLogged());
-  }
-}
-
-TEST_P(NlSocketExchangeTest, ReplyOfAnotherCommandFirst) {
-  StoreValue(5);
-  SetFault(sim::Fault::Kind::kOtherCommandFirst, 0, sim::kTestCmdList);
-  ExchangeOutcome outcome = Run();
-  EXPECT_TRUE(outcome.result);
-  if (GetParam() == Exchange::kAck) {
-    // The acknowledge exchange hands every data message to its handler.
-    EXPECT_THAT(outcome.handed, ::testing::ElementsAre(Seen{sim::kTestCmdList, 0},
-                                                       Seen{sim::kTestCmdValue, 5}));
-  } else {
-    EXPECT_THAT(outcome.handed, ::testing::ElementsAre(Seen{sim::kTestCmdValue, 5}));
-    EXPECT_EQ(1, log_.Count(INFO,
-                            "SendAndAwaitResponse: Incorrect received command, got 4 instead of 3",
-                            kTag))
-        << log_.Text();
-  }
-}
-
-TEST_P(NlSocketExchangeTest, NoAnswerTimesOut) {
-  SetFault(sim::Fault::Kind::kNoAnswer);
-  ExchangeOutcome outcome = Run();
-  EXPECT_FALSE(outcome.result);
-  EXPECT_TRUE(outcome.handed.empty());
-  EXPECT_THAT(Lines(WARNING), ::testing::ElementsAre(std::string(Operation()) +
-                                                     ": Error reading message: " +
-                                                     nl_geterror(-NLE_AGAIN)))
-      << log_.Text();
-}
-
-TEST_P(NlSocketExchangeTest, FailedSend) {
-  simulator_.Stop();
-  ExchangeOutcome outcome = Run();
-  EXPECT_FALSE(outcome.result);
-  std::vector<std::string> warnings = Lines(WARNING);
-  ASSERT_EQ(1u, warnings.size()) << log_.Text();
-  EXPECT_THAT(warnings[0],
-              ::testing::StartsWith(std::string(Operation()) + ": Error sending netlink message: "));
-}
-
-INSTANTIATE_TEST_SUITE_P(Exchanges, NlSocketExchangeTest,
-                         ::testing::Values(Exchange::kAck, Exchange::kResponse),
-                         [](const ::testing::TestParamInfo<Exchange>& info) {
-                           return info.param == Exchange::kAck ? "Ack" : "Response";
+INSTANTIATE_TEST_SUITE_P(Answers, NlSocketExchangeTest, ::testing::ValuesIn(Exchanges()),
+                         [](const ::testing::TestParamInfo<std::tuple<bool, Answer>>& info) {
+                           return std::string(std::get<0>(info.param) ? "Ack" : "Response") +
+                                  std::get<1>(info.param).name;
                          });
 
-TEST_F(NlSocketTest, AckWithoutDataSucceeds) {
-  SetFault(sim::Fault::Kind::kAckOnly);
-  UniqueNlMsg get = TestRequest(family_id_, sim::kTestCmdGet);
-  int handed = 0;
-  EXPECT_TRUE(socket_->SendAndAwaitAck(get.get(), [&handed](nl_msg*) {
-    ++handed;
-    return NL_OK;
-  }));
-  EXPECT_EQ(0, handed);
-  EXPECT_EQ(1, log_.Count(INFO, "SendAndAwaitAck: Received ACK", kTag));
-}
-
+// A reply's trailing acknowledgement must not upset the next exchange.
 TEST_F(NlSocketTest, ExchangesFollowOneAnotherOnOneSocket) {
   for (uint32_t value : {1u, 2u, 3u}) {
-    UniqueNlMsg set = TestRequest(family_id_, sim::kTestCmdSet);
-    nla_put_u32(set.get(), sim::kTestAttrValue, value);
+    UniqueNlMsg set = Request(sim::kTestCmdSet, sim::kTestAttrValue, value);
     ASSERT_TRUE(socket_->SendAndAwaitAck(set.get(), nullptr));
-    UniqueNlMsg get = TestRequest(family_id_, sim::kTestCmdGet);
-    uint32_t stored = 0;
-    ASSERT_TRUE(socket_->SendAndAwaitResponse(
-        get.get(), [&stored](nl_msg* msg) { stored = Inspect(msg).value; }, sim::kTestCmdValue));
-    EXPECT_EQ(value, stored);
+    UniqueNlMsg get = Request(sim::kTestCmdGet);
+    ASSERT_TRUE(socket_->SendAndAwaitResponse(get.get(), record_, sim::kTestCmdValue));
   }
+  EXPECT_THAT(handed_, ElementsAre(Seen{sim::kTestCmdValue, 1}, Seen{sim::kTestCmdValue, 2},
+                                   Seen{sim::kTestCmdValue, 3}));
 }
 
 TEST_F(NlSocketTest, ResolveRegisteredUnknownAndVanishedFamilies) {
@@ -278,163 +216,68 @@ TEST_F(NlSocketTest, ResolveRegisteredUnknownAndVanishedFamilies) {
   EXPECT_EQ(-NLE_OBJ_NOTFOUND, socket_->Resolve(sim::kTestFamilyName));
 }
 
-TEST_F(NlSocketTest, WatchDeliversEventsThroughTheLoopCallback) {
+TEST_F(NlSocketTest, WatchDeliversEventsToTheFirstHandlerUntilReleased) {
   socket_->DisableAutoAck();
-  std::function<void(int)> callback;
-  // Mode 1, exactly: the loop wakes the socket as writable.
-  EXPECT_CALL(event_loop_,
-              WatchFileDescriptor(socket_->fd(), static_cast<EventLoop::ReadyMode>(1), _))
-      .WillOnce(DoAll(SaveArg<2>(&callback), Return(true)));
-  std::vector<Seen> events;
-  ASSERT_TRUE(socket_->WatchNetlinkSocket(socket_, [&events](nl_msg* msg) {
-    events.push_back(Inspect(msg));
+  int fd = socket_->fd();
+  ExpectWatch();
+  ASSERT_TRUE(socket_->WatchNetlinkSocket(socket_, record_));
+  EXPECT_FALSE(socket_->WatchNetlinkSocket(socket_, [](nl_msg*) {
+    ADD_FAILURE() << "the refused handler was called";
     return NL_OK;
   }));
-  ASSERT_TRUE(Subscribe(2));
+  UniqueNlMsg subscribe = Request(sim::kTestCmdSubscribe, sim::kTestAttrCount, 3);
+  ASSERT_TRUE(socket_->SendAndAwaitAck(subscribe.get(), nullptr));
+  wake_(fd);
+  wake_(fd);
+  EXPECT_THAT(handed_, ElementsAre(Seen{sim::kTestCmdValue, 1}, Seen{sim::kTestCmdValue, 2}));
 
-  callback(socket_->fd());
-  callback(socket_->fd());
-  EXPECT_THAT(events, ::testing::ElementsAre(Seen{sim::kTestCmdValue, 1},
-                                             Seen{sim::kTestCmdValue, 2}));
-  EXPECT_CALL(event_loop_, StopWatchFileDescriptor(socket_->fd())).WillOnce(Return(true));
+  // The owner lets go without stopping; a wake-up already on its way finds
+  // the socket gone and leaves the third event unread.
+  socket_.reset();
+  wake_(fd);
+  EXPECT_EQ(2u, handed_.size());
+  EXPECT_EQ(1, log_.Count(WARNING, "WatchNetlinkSocket: socket is close", kTag));
 }
 
-TEST_F(NlSocketTest, SecondWatchIsRefusedAndKeepsTheFirstHandler) {
-  socket_->DisableAutoAck();
-  std::function<void(int)> callback;
-  EXPECT_CALL(event_loop_, WatchFileDescriptor(socket_->fd(), _, _))
-      .WillOnce(DoAll(SaveArg<2>(&callback), Return(true)));
-  std::vector<std::string> calls;
-  ASSERT_TRUE(socket_->WatchNetlinkSocket(socket_, [&calls](nl_msg*) {
-    calls.push_back("first");
-    return NL_OK;
-  }));
-  EXPECT_FALSE(socket_->WatchNetlinkSocket(socket_, [&calls](nl_msg*) {
-    calls.push_back("second");
-    return NL_OK;
-  }));
-  ASSERT_TRUE(Subscribe(1));
-  callback(socket_->fd());
-  EXPECT_THAT(calls, ::testing::ElementsAre("first"));
-  EXPECT_CALL(event_loop_, StopWatchFileDescriptor(socket_->fd())).WillOnce(Return(true));
-}
-
+// The strict loop sees no call.
 TEST_F(NlSocketTest, WatchNeedsALiveOwner) {
-  std::weak_ptr<NlSocket> empty;
-  EXPECT_FALSE(socket_->WatchNetlinkSocket(empty, [](nl_msg*) { return NL_OK; }));
-
-  std::weak_ptr<NlSocket> expired;
-  {
-    auto other = std::make_shared<TestSocket>(&event_loop_);
-    ASSERT_TRUE(other->Setup());
-    expired = other;
-  }
-  EXPECT_FALSE(socket_->WatchNetlinkSocket(expired, [](nl_msg*) { return NL_OK; }));
-  // The strict event loop saw no call at all.
-}
-
-TEST_F(NlSocketTest, WatchWithoutDescriptorOrRefusedByTheLoop) {
-  auto unconnected = std::make_shared<TestSocket>(&event_loop_);
-  EXPECT_FALSE(unconnected->WatchNetlinkSocket(unconnected, [](nl_msg*) { return NL_OK; }));
-  EXPECT_FALSE(unconnected->StopWatchNetlinkSocket());
-
-  EXPECT_CALL(event_loop_, WatchFileDescriptor(socket_->fd(), _, _)).WillOnce(Return(false));
-  EXPECT_FALSE(socket_->WatchNetlinkSocket(socket_, [](nl_msg*) { return NL_OK; }));
-  // Not watched, so the destructor has nothing to stop.
+  EXPECT_FALSE(socket_->WatchNetlinkSocket(std::weak_ptr<NlSocket>(), record_));
+  auto other = std::make_shared<TestSocket>(&event_loop_);
+  ASSERT_TRUE(other->Setup());
+  std::weak_ptr<NlSocket> expired = other;
+  other.reset();
+  EXPECT_FALSE(socket_->WatchNetlinkSocket(expired, record_));
 }
 
 TEST_F(NlSocketTest, StopThenWatchAgain) {
   ::testing::InSequence in_order;
-  EXPECT_CALL(event_loop_, WatchFileDescriptor(socket_->fd(), _, _)).WillOnce(Return(true));
-  EXPECT_CALL(event_loop_, StopWatchFileDescriptor(socket_->fd())).WillOnce(Return(true));
-  EXPECT_CALL(event_loop_, WatchFileDescriptor(socket_->fd(), _, _)).WillOnce(Return(true));
-  EXPECT_CALL(event_loop_, StopWatchFileDescriptor(socket_->fd())).WillOnce(Return(true));
-
-  ASSERT_TRUE(socket_->WatchNetlinkSocket(socket_, [](nl_msg*) { return NL_OK; }));
+  for (int i = 0; i < 2; ++i) {
+    EXPECT_CALL(event_loop_, WatchFileDescriptor(socket_->fd(), _, _)).WillOnce(Return(true));
+    EXPECT_CALL(event_loop_, StopWatchFileDescriptor(socket_->fd())).WillOnce(Return(true));
+  }
+  ASSERT_TRUE(socket_->WatchNetlinkSocket(socket_, record_));
   EXPECT_TRUE(socket_->StopWatchNetlinkSocket());
   EXPECT_EQ(1, log_.Count(INFO, "StopWatchNetlinkSocket", kTag));
-  EXPECT_TRUE(socket_->WatchNetlinkSocket(socket_, [](nl_msg*) { return NL_OK; }));
-  socket_.reset();
-}
-
-TEST_F(NlSocketTest, ReleasedSocketWarnsOnWakeUp) {
-  int fd = socket_->fd();
-  std::function<void(int)> callback;
-  EXPECT_CALL(event_loop_, WatchFileDescriptor(fd, _, _))
-      .WillOnce(DoAll(SaveArg<2>(&callback), Return(true)));
-  int handled = 0;
-  ASSERT_TRUE(socket_->WatchNetlinkSocket(socket_, [&handled](nl_msg*) {
-    ++handled;
-    return NL_OK;
-  }));
-  // The owner lets go; the socket's destructor stops the watch.
-  EXPECT_CALL(event_loop_, StopWatchFileDescriptor(fd)).WillOnce(Return(true));
-  socket_.reset();
-
-  // A wake-up that was already on its way.
-  callback(fd);
-  EXPECT_EQ(0, handled);
-  EXPECT_EQ(1, log_.Count(WARNING, "WatchNetlinkSocket: socket is close", kTag));
+  EXPECT_TRUE(socket_->WatchNetlinkSocket(socket_, record_));
 }
 
 TEST_F(NlSocketTest, ErrorWithoutErrorHandlerStopsTheRead) {
-  // Reads go through the reader's own callback set, which keeps libnl's
-  // sequence check; only a socket without auto-ack takes sequence 0.
+  // The reader keeps libnl's sequence check; only without auto-ack does a
+  // socket take the sequence 0 of unsolicited messages.
   socket_->DisableAutoAck();
   // One datagram: an unsolicited error report, then a data message.
   UniqueNlMsg batch;
-  nlmsghdr* error_header = nlmsg_put(batch.get(), 0, 0, NLMSG_ERROR, sizeof(nlmsgerr), 0);
-  ASSERT_NE(nullptr, error_header);
-  static_cast<nlmsgerr*>(nlmsg_data(error_header))->error = -EIO;
+  nlmsghdr* error = nlmsg_put(batch.get(), 0, 0, NLMSG_ERROR, sizeof(nlmsgerr), 0);
+  static_cast<nlmsgerr*>(nlmsg_data(error))->error = -EIO;
   UniqueNlMsg event = sim::DriverSimulator::NewEvent(family_id_, sim::kTestCmdValue);
-  nla_put_u32(event.get(), sim::kTestAttrValue, 1);
-  std::string bytes(reinterpret_cast<char*>(error_header), NLMSG_ALIGN(error_header->nlmsg_len));
+  std::string bytes(reinterpret_cast<char*>(error), NLMSG_ALIGN(error->nlmsg_len));
   bytes.append(reinterpret_cast<char*>(nlmsg_hdr(event.get())), nlmsg_hdr(event.get())->nlmsg_len);
   ASSERT_TRUE(simulator_.SendRaw(socket_->port(), bytes.data(), bytes.size()));
 
-  int handled = 0;
-  EXPECT_FALSE(socket_->ReceiveMessage([&handled](nl_msg*) {
-    ++handled;
-    return NL_OK;
-  }));
-  EXPECT_EQ(0, handled);
-  EXPECT_EQ(1, log_.Count(WARNING,
-                          std::string("ReceiveMessage: Error reading message: ") +
-                              nl_geterror(-nl_syserr2nlerr(EIO)),
-                          kTag))
-      << log_.Text();
-}
-
-// The whole path on the service's real loop: a watched socket's events reach
-// the handler when the loop polls.
-TEST(NlSocketLoopTest, EventsReachTheHandlerThroughTheEventLoop) {
-  sim::DriverSimulator simulator;
-  sim::TestFamily family(&simulator);
-  int family_id = simulator.RegisterFamily(sim::kTestFamilyName, &family);
-  ASSERT_TRUE(simulator.Start());
-  LooperBackedEventLoop loop;
-  sim::SimNlSocketFactory factory(&loop, sim::DriverSimulator::kDefaultPort);
-  std::shared_ptr<NlSocket> socket = factory.Create();
-  ASSERT_TRUE(socket);
-  socket->DisableAutoAck();
-
-  std::vector<Seen> events;
-  ASSERT_TRUE(socket->WatchNetlinkSocket(socket, [&events](nl_msg* msg) {
-    events.push_back(Inspect(msg));
-    return NL_OK;
-  }));
-  UniqueNlMsg subscribe = TestRequest(family_id, sim::kTestCmdSubscribe);
-  nla_put_u32(subscribe.get(), sim::kTestAttrCount, 3);
-  ASSERT_TRUE(socket->SendAndAwaitAck(subscribe.get(), nullptr));
-
-  for (int i = 0; i < 10 && events.size() < 3; ++i) {
-    android::Looper::getForThread()->pollOnce(100, nullptr, nullptr, nullptr);
-  }
-  EXPECT_THAT(events, ::testing::ElementsAre(Seen{sim::kTestCmdValue, 1},
-                                             Seen{sim::kTestCmdValue, 2},
-                                             Seen{sim::kTestCmdValue, 3}));
-  EXPECT_TRUE(socket->StopWatchNetlinkSocket());
-  simulator.Stop();
+  EXPECT_FALSE(socket_->ReceiveMessage(record_));
+  EXPECT_TRUE(handed_.empty());
+  EXPECT_THAT(Lines(WARNING), ElementsAre(std::string("ReceiveMessage: ") + kReadError +
+                                          nl_geterror(-nl_syserr2nlerr(EIO))));
 }
 
 }  // namespace

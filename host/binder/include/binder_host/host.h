@@ -35,9 +35,9 @@ binder_status_t Transact(AIBinder* binder, const std::function<void()>& call);
 // Harness: the process behind |binder| dies. The binder stops answering new
 // calls (calls already queued still run), AIBinder_isAlive turns false, and
 // each of its death links is queued for the service thread. Killing a dead
-// binder does nothing. Hold a reference to the binder for as long as the
-// death matters: once its last reference is gone, the object's next
-// asBinder() makes a new, living binder.
+// binder does nothing. An object keeps one binder for its whole life, so
+// a killed object stays dead: its later asBinder() calls return the same
+// dead binder, as a proxy to a dead process would.
 void KillBinder(AIBinder* binder);
 
 // Harness: forgets registered services, fails queued calls with

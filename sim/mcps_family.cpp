@@ -240,9 +240,11 @@ void McpsFamily::SetCalibrations(nlattr** attrs, Responder& responder) {
     }
     std::string key = nla_get_string(fields[MCPS802154_CALIBRATION_ATTR_KEY]);
     uint32_t value = nla_get_u32(fields[MCPS802154_CALIBRATION_ATTR_VALUE]);
-    if (radios_->ReceiveCalibration(hw_index, key, value)) {
-      built = PutVerdict(reply.get(), nullptr, 0);
-    } else if (key.size() + 1 <= kMcpsCalibrationKeyMaxLen) {
+    // Accepted keys go unmentioned: the reply names only what was refused,
+    // so the status the service keeps (the last one) is never masked by a
+    // later success.
+    if (radios_->ReceiveCalibration(hw_index, key, value)) continue;
+    if (key.size() + 1 <= kMcpsCalibrationKeyMaxLen) {
       built = PutVerdict(reply.get(), &key, -ENOENT);
     } else {
       // Too long to be named back within the reply's key limit.

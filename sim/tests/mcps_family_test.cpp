@@ -170,7 +170,7 @@ TEST_F(McpsFamilyTest, LargeCalibrationArrivesWholeInStoreOrder) {
 
 TEST_F(McpsFamilyTest, RefusedKeysAndFailedExchangesFailTheTransfer) {
   radios_.AddRadio(kHw, 0u);
-  std::map<std::string, uint32_t> values = AddKnownKeys(200);
+  AddKnownKeys(200);
   // The driver refuses a message beyond its payload limit, as the kernel would.
   family_.SetMaxPayload(McpsUtils::CalibrationPayloadBudget() - 64);
   EXPECT_FALSE(mcps_.SetCalibration(kHw, &store_));
@@ -185,13 +185,17 @@ TEST_F(McpsFamilyTest, RefusedKeysAndFailedExchangesFailTheTransfer) {
   // None of these transfers went past its first message.
   EXPECT_EQ(Radio(kHw).calibration_messages, 0);
 
-  // An unknown key is named in the reply; the known ones are still kept.
-  store_.Set("zz.unknown", "0x4010");
+  // An unknown key ahead of known ones in the same message is named in the
+  // reply and its status ends the transfer after that message; the known
+  // keys beside it are still kept.
+  store_.Set("aa.unknown", "0x4010");
   EXPECT_FALSE(mcps_.SetCalibration(kHw, &store_));
   SimRadio radio = Radio(kHw);
-  EXPECT_EQ(radio.calibration, values);
-  EXPECT_EQ(radio.calibration_keys_received.size(), 201u);
-  EXPECT_TRUE(log_.Contains(ERROR, "Error on key zz.unknown", kTag));
+  EXPECT_EQ(radio.calibration_messages, 1);
+  EXPECT_EQ(radio.calibration_keys_received.front(), "aa.unknown");
+  EXPECT_LT(radio.calibration_keys_received.size(), 201u);
+  EXPECT_EQ(radio.calibration.size(), radio.calibration_keys_received.size() - 1);
+  EXPECT_TRUE(log_.Contains(ERROR, "Error on key aa.unknown", kTag));
 }
 
 }  // namespace

@@ -47,16 +47,24 @@ TEST(GeneratedTypesTest, EnumerationsPrintNamesOrSignedNumbers) {
     std::string text;
     std::string expected;
   } cases[] = {
-      {toString(uwb::DeviceType::CONTROLEE), "CONTROLEE"},
-      {toString(uwb::RangingRoundUsage::DS_TWR), "DS_TWR"},
+      {toString(uwb::DeviceType(1)), "CONTROLEE"},
+      {toString(uwb::DeviceRole(1)), "INITIATOR"},
+      {toString(uwb::RangingRoundUsage(2)), "DS_TWR"},
+      {toString(uwb::MultiNodeMode(2)), "MANY_TO_MANY"},
       {toString(uwb::RframeConfig(0)), "SPO"},
       {toString(uwb::RframeConfig(2)), "2"},
       {toString(uwb::RframeConfig(3)), "SP3"},
+      {toString(uwb::PrfMode(1)), "HPRF"},
+      {toString(uwb::PreambleDuration(1)), "T64_SYMBOLS"},
       {toString(uwb::PsduDataRate(3)), "RATE_31M2"},
+      {toString(uwb::BprfPhrDataRate(1)), "RATE_6M81"},
+      {toString(uwb::FcsType(1)), "CRC_32"},
       {toString(uwb::PsduDataRate(-1)), "-1"},
+      {toString(uwb::AoaType(2)), "AZIMUTH_AND_ELEVATION"},
       {toString(uwb::AoaType(-128)), "-128"},
       {toString(uwb::FiraStsConfig(2)), "DYNAMIC_FOR_CONTROLEE_INDIVIDUAL_KEY"},
       {toString(uwb::MeasurementReportType(1)), "RESPONDER_TO_INITIATOR"},
+      {toString(uwb::AoaResultRequest(1)), "REQ_AOA_RESULTS"},
   };
   for (const auto& c : cases) EXPECT_EQ(c.expected, c.text);
 

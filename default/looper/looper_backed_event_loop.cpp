@@ -1,3 +1,4 @@
+// No LOG_TAG here on purpose: the loop logs under the process's default tag.
 #include "looper/looper_backed_event_loop.h"
 
 #include <android-base/logging.h>

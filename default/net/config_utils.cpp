@@ -76,8 +76,10 @@ bool ConfigUtils::Save(const char* path) {
     LOG(ERROR) << "Save Cannot open file: " << path;
     return false;
   }
+  // Written by length: a value read from a line holding a NUL keeps it.
   for (const auto& [key, value] : map_) {
-    fprintf(file.get(), "%s = %s", key.c_str(), value.c_str());
+    const std::string entry = key + " = " + value;
+    fwrite(entry.data(), 1, entry.size(), file.get());
   }
   return true;
 }

@@ -110,36 +110,38 @@ bool NlSocket::SendAndAwaitAck(nl_msg* msg, std::function<int(nl_msg*)> on_messa
 bool NlSocket::SendAndAwaitResponse(nl_msg* msg, std::function<void(nl_msg*)> on_response,
                                     int cmd) {
   LOG(INFO) << "SendAndAwaitResponse";
-  bool got_response = false;
-  int error = 0;
+  // A failed send leaves both handlers installed past this call, so what they
+  // touch lives with them, not in this frame.
+  auto got_response = std::make_shared<bool>(false);
+  auto error = std::make_shared<int>(0);
 
-  reader_->SetMessageHandler([&got_response, &on_response, cmd](nl_msg* reply) {
-    int received = genlmsg_hdr(nlmsg_hdr(reply))->cmd;
-    // An empty callback cannot take the response, so it counts as a mismatch.
-    if (on_response && received == cmd) {
-      got_response = true;
-      on_response(reply);
-    } else {
-      LOG(INFO) << "SendAndAwaitResponse: Incorrect received command, got " << received
-                << " instead of " << cmd;
-    }
-    return NL_SKIP;
-  });
-  reader_->SetErrorHandler([&error](nlmsgerr* err) {
+  reader_->SetMessageHandler(
+      [got_response, on_response = std::move(on_response), cmd](nl_msg* reply) {
+        int received = genlmsg_hdr(nlmsg_hdr(reply))->cmd;
+        // An empty callback cannot take the response, so it counts as a mismatch.
+        if (on_response && received == cmd) {
+          *got_response = true;
+          on_response(reply);
+        } else {
+          LOG(INFO) << "SendAndAwaitResponse: Incorrect received command, got " << received
+                    << " instead of " << cmd;
+        }
+        return NL_SKIP;
+      });
+  reader_->SetErrorHandler([error](nlmsgerr* err) {
     LOG(WARNING) << "SendAndAwaitResponse: Nl error: " << err->error;
-    error = err->error;
+    *error = err->error;
     return NL_STOP;
   });
 
   int result = nl_send_auto(sock_, msg);
   if (result < 0) {
-    // The handlers stay installed; the next exchange replaces them.
     LOG(WARNING) << "SendAndAwaitResponse: Error sending netlink message: "
                  << nl_geterror(result);
     return false;
   }
 
-  while (!got_response && error == 0) {
+  while (!*got_response && *error == 0) {
     LOG(INFO) << "SendAndAwaitResponse: Read message";
     result = reader_->read_message(sock_);
     if (result < 0) {
@@ -150,7 +152,7 @@ bool NlSocket::SendAndAwaitResponse(nl_msg* msg, std::function<void(nl_msg*)> on
 
   reader_->ClearErrorHandler();
   reader_->ClearMessageHandler();
-  return result >= 0 && got_response && error == 0;
+  return result >= 0 && *got_response && *error == 0;
 }
 
 bool NlSocket::WatchNetlinkSocket(std::weak_ptr<NlSocket> self,

@@ -36,11 +36,10 @@ class NlSocket {
   virtual bool StopWatchNetlinkSocket();
 
  protected:
-  // What Setup() gives every socket, for overrides that connect another way.
+  // What Setup() gives every socket, and the means for Setup() overrides that
+  // connect the socket another way to do the same.
   static constexpr int kBufferBytes = 8192;
   static constexpr int kReceiveTimeoutSeconds = 1;
-
-  // For Setup() overrides that connect the socket another way.
   void set_sock(nl_sock* sock);
   nl_sock* sock() const { return sock_; }
 

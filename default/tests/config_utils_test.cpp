@@ -112,6 +112,9 @@ TEST_F(ConfigUtilsTest, HostileFilesLoadWithoutHarm) {
   ConfigUtils nul_store;
   EXPECT_TRUE(nul_store.Load(WriteFile("nul.conf", std::string("a=1\0b=2\n", 8)).c_str()));
   EXPECT_EQ((Map{{"a", std::string("1\0b=2", 5)}}), Contents(nul_store));
+  const std::string saved = std::string(dir_.path) + "/nul.out";
+  ASSERT_TRUE(nul_store.Save(saved.c_str()));
+  EXPECT_EQ(std::string("a = 1\0b=2", 9), ReadFile(saved));
 
   // A directory opens but reads nothing.
   ConfigUtils dir_store;

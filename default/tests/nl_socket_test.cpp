@@ -276,8 +276,22 @@ TEST_F(NlSocketTest, ErrorWithoutErrorHandlerStopsTheRead) {
 
   EXPECT_FALSE(socket_->ReceiveMessage(record_));
   EXPECT_TRUE(handed_.empty());
-  EXPECT_THAT(Lines(WARNING), ElementsAre(std::string("ReceiveMessage: ") + kReadError +
-                                          nl_geterror(-nl_syserr2nlerr(EIO))));
+  const std::string read_error =
+      std::string("ReceiveMessage: ") + kReadError + nl_geterror(-nl_syserr2nlerr(EIO));
+  EXPECT_THAT(Lines(WARNING), ElementsAre(read_error));
+
+  // A response exchange whose send failed leaves its handlers installed; its
+  // error handler then sees the next error report, past the exchange's end.
+  simulator_.Stop();
+  UniqueNlMsg get = Request(sim::kTestCmdGet);
+  EXPECT_FALSE(socket_->SendAndAwaitResponse(get.get(), record_, sim::kTestCmdValue));
+  ASSERT_TRUE(simulator_.Start());
+  log_.Reset();
+  ASSERT_TRUE(simulator_.SendRaw(socket_->port(), bytes.data(), bytes.size()));
+  EXPECT_FALSE(socket_->ReceiveMessage(record_));
+  EXPECT_TRUE(handed_.empty());
+  EXPECT_THAT(Lines(WARNING),
+              ElementsAre("SendAndAwaitResponse: Nl error: " + std::to_string(-EIO), read_error));
 }
 
 }  // namespace

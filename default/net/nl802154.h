@@ -81,9 +81,9 @@ inline const Nl802154Policy& Nl802154AttributePolicy() {
 inline const Nl802154CapabilityPolicy& Nl802154CapabilityAttributePolicy() {
   static const Nl802154CapabilityPolicy policy = [] {
     Nl802154CapabilityPolicy p{};
+    // No minimum length: a phy without any channel sends an empty list, which
+    // reads as one without UWB channels rather than as a broken reply.
     p[NL802154_CAP_ATTR_CHANNELS].type = NLA_NESTED;
-    // The kernel lists every page, so a list too short for one is broken.
-    p[NL802154_CAP_ATTR_CHANNELS].minlen = NLA_HDRLEN;
     return p;
   }();
   return policy;

@@ -31,7 +31,9 @@ void NlSocket::set_sock(nl_sock* sock) {
   sock_ = sock;
 }
 
-bool NlSocket::Setup() {
+bool NlSocket::Setup() { return SetupWith(genl_connect); }
+
+bool NlSocket::SetupWith(const std::function<int(nl_sock*)>& connect) {
   set_sock(nl_socket_alloc());
   if (sock_ == nullptr) {
     LOG(ERROR) << "Setup: Failed to create netlink socket";
@@ -40,7 +42,7 @@ bool NlSocket::Setup() {
   // Before the connect there is no descriptor yet, so libnl refuses this and
   // the connect applies its own default; kept in this order on purpose.
   nl_socket_set_buffer_size(sock_, kBufferBytes, kBufferBytes);
-  if (genl_connect(sock_) != 0) {
+  if (connect(sock_) != 0) {
     LOG(ERROR) << "Setup: Failed to connect to generic netlink";
     set_sock(nullptr);
     return false;
@@ -136,8 +138,7 @@ bool NlSocket::SendAndAwaitResponse(nl_msg* msg, std::function<void(nl_msg*)> on
 
   int result = nl_send_auto(sock_, msg);
   if (result < 0) {
-    LOG(WARNING) << "SendAndAwaitResponse: Error sending netlink message: "
-                 << nl_geterror(result);
+    LOG(WARNING) << "SendAndAwaitResponse: Error sending netlink message: " << nl_geterror(result);
     return false;
   }
 

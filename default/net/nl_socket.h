@@ -36,14 +36,18 @@ class NlSocket {
   virtual bool StopWatchNetlinkSocket();
 
  protected:
-  // What Setup() gives every socket, and the means for Setup() overrides that
-  // connect the socket another way to do the same.
-  static constexpr int kBufferBytes = 8192;
-  static constexpr int kReceiveTimeoutSeconds = 1;
-  void set_sock(nl_sock* sock);
+  // Setup() with |connect| in place of genl_connect, for overrides that reach
+  // the driver another way: allocation, buffers, receive timeout and log lines
+  // stay those of every other socket. |connect| returns 0 on success.
+  bool SetupWith(const std::function<int(nl_sock*)>& connect);
   nl_sock* sock() const { return sock_; }
 
  private:
+  static constexpr int kBufferBytes = 8192;
+  static constexpr int kReceiveTimeoutSeconds = 1;
+
+  void set_sock(nl_sock* sock);
+
   EventLoop* event_loop_;
   nl_sock* sock_;
   bool watching_;

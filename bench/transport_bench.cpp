@@ -47,19 +47,12 @@ class SimulatorSession {
   int family_id_;
 };
 
-UniqueNlMsg Request(int family_id, uint8_t cmd) {
-  UniqueNlMsg msg;
-  genlmsg_put(msg.get(), NL_AUTO_PORT, NL_AUTO_SEQ, family_id, 0, 0, cmd,
-              sim::kTestFamilyVersion);
-  return msg;
-}
-
 void BM_SendAndAwaitAck(benchmark::State& state) {
   SimulatorSession session;
   std::unique_ptr<NlSocket> socket = session.factory().Create();
   uint32_t value = 0;
   for (auto _ : state) {
-    UniqueNlMsg set = Request(session.family_id(), sim::kTestCmdSet);
+    UniqueNlMsg set = sim::TestFamily::NewRequest(session.family_id(), sim::kTestCmdSet);
     nla_put_u32(set.get(), sim::kTestAttrValue, ++value);
     if (!socket->SendAndAwaitAck(set.get(), nullptr)) state.SkipWithError("exchange failed");
   }
@@ -70,7 +63,7 @@ void BM_SendAndAwaitResponse(benchmark::State& state) {
   SimulatorSession session;
   std::unique_ptr<NlSocket> socket = session.factory().Create();
   for (auto _ : state) {
-    UniqueNlMsg get = Request(session.family_id(), sim::kTestCmdGet);
+    UniqueNlMsg get = sim::TestFamily::NewRequest(session.family_id(), sim::kTestCmdGet);
     bool ok = socket->SendAndAwaitResponse(
         get.get(), [](nl_msg* msg) { benchmark::DoNotOptimize(msg); }, sim::kTestCmdValue);
     if (!ok) state.SkipWithError("exchange failed");
@@ -84,7 +77,7 @@ void BM_OneShotSendAndAwaitAck(benchmark::State& state) {
   SimulatorSession session;
   uint32_t value = 0;
   for (auto _ : state) {
-    UniqueNlMsg set = Request(session.family_id(), sim::kTestCmdSet);
+    UniqueNlMsg set = sim::TestFamily::NewRequest(session.family_id(), sim::kTestCmdSet);
     nla_put_u32(set.get(), sim::kTestAttrValue, ++value);
     if (!session.factory().SendAndAwaitAck(set.get())) state.SkipWithError("exchange failed");
   }
@@ -107,7 +100,7 @@ void BM_BareSocketRoundTrip(benchmark::State& state) {
     state.SkipWithError("cannot set up the bare socket");
     return;
   }
-  UniqueNlMsg set = Request(session.family_id(), sim::kTestCmdSet);
+  UniqueNlMsg set = sim::TestFamily::NewRequest(session.family_id(), sim::kTestCmdSet);
   nla_put_u32(set.get(), sim::kTestAttrValue, 1);
   nlmsghdr* header = nlmsg_hdr(set.get());
   header->nlmsg_flags |= NLM_F_REQUEST | NLM_F_ACK;

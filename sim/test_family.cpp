@@ -12,6 +12,12 @@ namespace sim {
 
 TestFamily::TestFamily(DriverSimulator* simulator) : simulator_(simulator), value_(0) {}
 
+UniqueNlMsg TestFamily::NewRequest(int family_id, uint8_t cmd) {
+  UniqueNlMsg msg;
+  genlmsg_put(msg.get(), NL_AUTO_PORT, NL_AUTO_SEQ, family_id, 0, 0, cmd, kTestFamilyVersion);
+  return msg;
+}
+
 void TestFamily::HandleRequest(const Request& request, Responder& responder) {
   nlattr* attrs[kTestAttrMax + 1];
   if (genlmsg_parse(nlmsg_hdr(request.msg), 0, attrs, kTestAttrMax, kTestPolicy) < 0) {

@@ -2,6 +2,7 @@
 
 #include <cstdint>
 
+#include "net/unique_nl_msg.h"
 #include "sim/driver_simulator.h"
 #include "sim/family_handler.h"
 #include "sim/responder.h"
@@ -19,6 +20,9 @@ class TestFamily : public FamilyHandler {
   explicit TestFamily(DriverSimulator* simulator);
 
   void HandleRequest(const Request& request, Responder& responder) override;
+
+  // A client's request of |cmd|, built as the service builds its own.
+  static UniqueNlMsg NewRequest(int family_id, uint8_t cmd);
 
  private:
   DriverSimulator* simulator_;

@@ -42,12 +42,6 @@ class DescriptorsExhausted {
   rlimit saved_;
 };
 
-UniqueNlMsg TestRequest(int family_id, uint8_t cmd) {
-  UniqueNlMsg msg;
-  genlmsg_put(msg.get(), NL_AUTO_PORT, NL_AUTO_SEQ, family_id, 0, 0, cmd, sim::kTestFamilyVersion);
-  return msg;
-}
-
 // The production factory and the simulator's behave alike when no socket can
 // be made.
 TEST(NlSocketFactoryTest, NothingWithoutDescriptors) {
@@ -91,11 +85,11 @@ TEST(NlSocketFactoryTest, OneShotsUseASocketOfTheirOwn) {
   ASSERT_TRUE(simulator.Start());
   sim::SimNlSocketFactory factory(nullptr, simulator.port());
 
-  UniqueNlMsg set = TestRequest(family_id, sim::kTestCmdSet);
+  UniqueNlMsg set = sim::TestFamily::NewRequest(family_id, sim::kTestCmdSet);
   nla_put_u32(set.get(), sim::kTestAttrValue, 77);
   EXPECT_TRUE(factory.SendAndAwaitAck(set.get()));
   uint32_t value = 0;
-  UniqueNlMsg get = TestRequest(family_id, sim::kTestCmdGet);
+  UniqueNlMsg get = sim::TestFamily::NewRequest(family_id, sim::kTestCmdGet);
   EXPECT_TRUE(factory.SendAndAwaitResponse(
       get.get(),
       [&value](nl_msg* msg) {

@@ -75,9 +75,7 @@ class NlSocketTest : public ::testing::Test {
 
   // A test-family request, with |attr| set to |value| unless it is 0.
   UniqueNlMsg Request(uint8_t cmd, int attr = 0, uint32_t value = 0) {
-    UniqueNlMsg msg;
-    genlmsg_put(msg.get(), NL_AUTO_PORT, NL_AUTO_SEQ, family_id_, 0, 0, cmd,
-                sim::kTestFamilyVersion);
+    UniqueNlMsg msg = sim::TestFamily::NewRequest(family_id_, cmd);
     if (attr != 0) nla_put_u32(msg.get(), attr, value);
     return msg;
   }

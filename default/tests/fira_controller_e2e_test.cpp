@@ -2,21 +2,16 @@
 // through its binder proxy; the controller runs on the harness's service
 // thread with the real driver clients against the simulated driver.
 
-#include <algorithm>
-#include <chrono>
 #include <cmath>
-#include <condition_variable>
 #include <memory>
-#include <mutex>
-#include <optional>
 #include <string>
 #include <vector>
 
-#include <aidl/aidl/hardware/dalix/uwb/BnFiraSessionCallback.h>
 #include <gtest/gtest.h>
 
 #include "fira_controller.h"
 #include "sim/service_harness.h"
+#include "tests/fira_client_callback.h"
 #include "tests/fira_session_builder.h"
 
 namespace hardware {
@@ -24,64 +19,6 @@ namespace dalix {
 namespace {
 
 namespace uwb = aidl::hardware::dalix::uwb;
-using ndk::ScopedAStatus;
-
-// The client's callback. It runs on the service thread; the test waits on
-// what it recorded.
-class ClientCallback : public uwb::BnFiraSessionCallback {
- public:
-  using Addresses = std::vector<uwb::UwbAddress>;
-  struct Result {
-    uwb::FiraRangingData data;
-    std::vector<uwb::FiraTwrMeasurement> measurements;
-  };
-
-  ScopedAStatus onTwrResult(const uwb::FiraRangingData& data,
-                            const std::vector<uwb::FiraTwrMeasurement>& measurements) override {
-    return Notify("", Result{data, measurements});
-  }
-  ScopedAStatus onControleesAdded(int32_t id, const Addresses&) override {
-    return Notify("added " + std::to_string(id));
-  }
-  ScopedAStatus onControleesAddFailed(int32_t id, const Addresses&, int32_t) override {
-    return Notify("add failed " + std::to_string(id));
-  }
-  ScopedAStatus onControleesRemoved(int32_t id, const Addresses&) override {
-    return Notify("removed " + std::to_string(id));
-  }
-  ScopedAStatus onControleesRemoveFailed(int32_t id, const Addresses&, int32_t) override {
-    return Notify("remove failed " + std::to_string(id));
-  }
-  ScopedAStatus onSessionStopped(int32_t id) override {
-    return Notify("stopped " + std::to_string(id));
-  }
-
-  // The results once there are more than |count|; empty after 5 s.
-  std::vector<Result> ResultsBeyond(size_t count) {
-    std::unique_lock<std::mutex> lock(mutex_);
-    changed_.wait_for(lock, std::chrono::seconds(5), [&] { return results_.size() > count; });
-    return results_.size() > count ? results_ : std::vector<Result>();
-  }
-  bool WaitForEvent(const std::string& event) {
-    std::unique_lock<std::mutex> lock(mutex_);
-    return changed_.wait_for(lock, std::chrono::seconds(5), [&] {
-      return std::find(events_.begin(), events_.end(), event) != events_.end();
-    });
-  }
-
- private:
-  ScopedAStatus Notify(const std::string& event, std::optional<Result> result = std::nullopt) {
-    std::lock_guard<std::mutex> lock(mutex_);
-    if (!event.empty()) events_.push_back(event);
-    if (result.has_value()) results_.push_back(*result);
-    changed_.notify_all();
-    return ScopedAStatus::ok();
-  }
-  std::mutex mutex_;
-  std::condition_variable changed_;
-  std::vector<std::string> events_;
-  std::vector<Result> results_;
-};
 
 class FiraControllerE2eTest : public ::testing::Test {
  protected:
@@ -100,15 +37,10 @@ class FiraControllerE2eTest : public ::testing::Test {
       }
     });
     for (auto& proxy : proxies_) {
-      callbacks_.push_back(ndk::SharedRefBase::make<ClientCallback>());
+      callbacks_.push_back(ndk::SharedRefBase::make<FiraClientCallback>());
       ASSERT_TRUE(proxy->setSessionCallback(callbacks_.back()).isOk());
     }
   }
-  void TearDown() override {
-    proxies_.clear();
-    harness_.reset();
-  }
-
   // A session ranging every 20 ms with |peers|, which the world places on a
   // circle, a line and a spot around the radio.
   uwb::FiraTwrSession MovingPeers(int32_t id, const std::vector<uint16_t>& peers) {
@@ -129,7 +61,7 @@ class FiraControllerE2eTest : public ::testing::Test {
   // Results of |radio| arrive for session |id| and carry each peer's true
   // distance, in centimetres, at the result's time.
   void ExpectRanging(int radio, int32_t id, const std::vector<uint16_t>& peers) {
-    const auto results = callbacks_[radio]->ResultsBeyond(3);
+    const auto results = callbacks_[radio]->WaitForResults(3);
     ASSERT_FALSE(results.empty());
     const auto& last = results.back();
     EXPECT_EQ(id, last.data.sessionId);
@@ -147,7 +79,7 @@ class FiraControllerE2eTest : public ::testing::Test {
 
   std::unique_ptr<sim::ServiceHarness> harness_;
   std::vector<std::shared_ptr<uwb::IFiraController>> proxies_;
-  std::vector<std::shared_ptr<ClientCallback>> callbacks_;
+  std::vector<std::shared_ptr<FiraClientCallback>> callbacks_;
 };
 
 TEST_F(FiraControllerE2eTest, ClientRunsAWholeSession) {
@@ -158,15 +90,15 @@ TEST_F(FiraControllerE2eTest, ClientRunsAWholeSession) {
   ExpectRanging(0, 7, {0x0002, 0x0003, 0x0004});
 
   ASSERT_TRUE(fira.addControlees(7, {{{0x00, 0x05}}}, std::nullopt).isOk());
-  EXPECT_TRUE(callbacks_[0]->WaitForEvent("added 7"));
+  EXPECT_TRUE(callbacks_[0]->WaitForEvent("onAdded7"));
   ASSERT_TRUE(fira.removeControlees(7, {{{0x00, 0x05}}}).isOk());
-  EXPECT_TRUE(callbacks_[0]->WaitForEvent("removed 7"));
+  EXPECT_TRUE(callbacks_[0]->WaitForEvent("onRemoved7"));
   // The driver refuses to remove a controlee it does not have.
   ASSERT_TRUE(fira.removeControlees(7, {{{0x00, 0x05}}}).isOk());
-  EXPECT_TRUE(callbacks_[0]->WaitForEvent("remove failed 7"));
+  EXPECT_TRUE(callbacks_[0]->WaitForEvent("onRemoveFailed7"));
 
   ASSERT_TRUE(fira.stopRangingSession(7).isOk());
-  EXPECT_TRUE(callbacks_[0]->WaitForEvent("stopped 7"));
+  EXPECT_TRUE(callbacks_[0]->WaitForEvent("onStopped7"));
   int32_t count = -1;
   EXPECT_TRUE(fira.getSessionCount(&count).isOk());
   EXPECT_EQ(1, count);
@@ -186,7 +118,7 @@ TEST_F(FiraControllerE2eTest, TwoRadiosRangeAtOnce) {
   ExpectRanging(1, 2, {0x0004});
   for (int radio : {0, 1}) {
     ASSERT_TRUE(proxies_[radio]->stopRangingSession(radio + 1).isOk());
-    EXPECT_TRUE(callbacks_[radio]->WaitForEvent("stopped " + std::to_string(radio + 1)));
+    EXPECT_TRUE(callbacks_[radio]->WaitForEvent("onStopped" + std::to_string(radio + 1)));
   }
 }
 

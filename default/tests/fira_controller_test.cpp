@@ -8,13 +8,13 @@
 #include <tuple>
 #include <vector>
 
-#include <aidl/aidl/hardware/dalix/uwb/BnFiraSessionCallback.h>
 #include <android-base/logging.h>
 #include <android-base/strings.h>
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
 #include "net/mcps802154.h"
+#include "tests/fira_client_callback.h"
 #include "tests/fira_session_builder.h"
 #include "tests/log_capture.h"
 #include "tests/mock_driver_clients.h"
@@ -109,37 +109,6 @@ TEST(CheckTwrSessionFieldsTest, FirstFailedCheckGivesItsMessage) {
 }
 #undef SET
 
-// The client's session callback: writes each call into the shared log.
-class RecordingSessionCallback : public aidl::hardware::dalix::uwb::BnFiraSessionCallback {
- public:
-  using Addresses = std::vector<UwbAddress>;
-  explicit RecordingSessionCallback(std::vector<std::string>* calls) : calls_(calls) {}
-  ScopedAStatus onTwrResult(const FiraController::FiraRangingData& data,
-                            const std::vector<FiraController::FiraTwrMeasurement>&) override {
-    return Log("onResult", data.sessionId);
-  }
-  ScopedAStatus onControleesAdded(int32_t id, const Addresses&) override {
-    return Log("onAdded", id);
-  }
-  ScopedAStatus onControleesAddFailed(int32_t id, const Addresses&, int32_t reason) override {
-    return Log("onAddFailed", id, reason);
-  }
-  ScopedAStatus onControleesRemoved(int32_t id, const Addresses&) override {
-    return Log("onRemoved", id);
-  }
-  ScopedAStatus onControleesRemoveFailed(int32_t id, const Addresses&, int32_t reason) override {
-    return Log("onRemoveFailed", id, reason);
-  }
-  ScopedAStatus onSessionStopped(int32_t id) override { return Log("onStopped", id); }
-
- private:
-  ScopedAStatus Log(const char* name, int32_t id, int32_t reason = 0) {
-    calls_->push_back(name + std::to_string(id) + (reason != 0 ? "?" : ""));
-    return ScopedAStatus::fromExceptionCode(EX_TRANSACTION_FAILED);  // to be ignored
-  }
-  std::vector<std::string>* calls_;
-};
-
 // One call on the controller, named after the operation it makes.
 struct Op {
   std::string name;  // empty for the driver's reports, which log nothing
@@ -152,7 +121,8 @@ struct Op {
 // (Hw: hardware info, Up?: interface state, Up0/Up1: interface down/up,
 // Fira/Sched: region/default scheduler set, Addr: short address), so that a
 // case states its status, exact traffic, and the sessions and running count
-// it leaves, as one line. Posted tasks run after "|", once the call returned.
+// it leaves, as one line. The client's callbacks follow the driver's; posted
+// tasks run after "|", once the call returned.
 class FiraControllerTest : public ::testing::Test {
  protected:
   enum Begin { kEmpty, kInit, kRun, kRunInit, kInitNoCallback };
@@ -223,6 +193,7 @@ class FiraControllerTest : public ::testing::Test {
                                                            &fira_, &loop_);
     scheduler_ = kMcpsSchedulerDefault;
     up_ = true;
+    callback_ = ndk::SharedRefBase::make<FiraClientCallback>();
     if (start != kInitNoCallback) (void)controller_->setSessionCallback(callback_);
     if (start != kEmpty) (void)controller_->initNewTwrSession(ValidFiraSession(1));
     if (start == kRun || start == kRunInit) (void)controller_->startRangingSession(1);
@@ -254,8 +225,12 @@ class FiraControllerTest : public ::testing::Test {
     }
     LogCapture log;
     const ScopedAStatus status = c.op.run(*controller_);
+    const std::vector<std::string> during = callback_->Events();
+    calls_.insert(calls_.end(), during.begin(), during.end());
     if (!tasks_.empty()) calls_.push_back("|");
     for (const auto& task : tasks_) task();
+    const std::vector<std::string> after = callback_->Events();
+    calls_.insert(calls_.end(), after.begin() + during.size(), after.end());
     EXPECT_EQ(c.expected, Outcome(status)) << c.op.name;
     // Every operation logs its own name before anything else.
     const std::vector<LogCapture::Entry> lines = log.Entries();
@@ -280,8 +255,7 @@ class FiraControllerTest : public ::testing::Test {
   StrictMock<MockIeeeUtils> ieee_;
   StrictMock<MockFiraRegionUtils> fira_;
   StrictMock<MockEventLoop> loop_;
-  std::shared_ptr<RecordingSessionCallback> callback_ =
-      ndk::SharedRefBase::make<RecordingSessionCallback>(&calls_);
+  std::shared_ptr<FiraClientCallback> callback_;
   std::shared_ptr<FiraController> controller_;
 };
 
@@ -403,8 +377,8 @@ TEST_F(FiraControllerTest, EveryOperationFromEveryState) {
       {kRun, OP(reset), "!Hw", "-7|Up? Up0 Hw|1:1 #1"},
       {kInit, OP(reset), "!Sched", "-7|Up? Hw Sched|1:0 #0"},
 
-      {kRunInit, Stopped(1), "", "0|onStopped1 Unsub Up?|1:0 2:0 #0"},
-      {kRun, Stopped(1), "!Up", "0|onStopped1 Unsub Up? Up0|1:0 #0"},
+      {kRunInit, Stopped(1), "", "0|Unsub Up? onStopped1|1:0 2:0 #0"},
+      {kRun, Stopped(1), "!Up", "0|Unsub Up? Up0 onStopped1|1:0 #0"},
       // Unknown ids are recorded, and the count is not guarded.
       {kEmpty, Stopped(5), "", "0|onStopped5|5:0 #4294967295"},
   };

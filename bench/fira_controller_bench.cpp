@@ -180,7 +180,7 @@ void BM_FiraNotificationToClient(benchmark::State& state) {
   }
   state.SetItemsProcessed(state.iterations());
 }
-BENCHMARK(BM_FiraNotificationToClient)->UseRealTime();
+BENCHMARK(BM_FiraNotificationToClient)->MeasureProcessCPUTime()->UseRealTime();
 
 // A binder call from the client's thread, with no session (argument 0) or
 // while one session ranges every |argument| milliseconds. Reports the

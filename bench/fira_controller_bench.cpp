@@ -112,8 +112,10 @@ class RunningSession {
     }
   }
   ~RunningSession() {
-    if (proxy_ != nullptr) (void)proxy_->stopRangingSession(kSessionId);
-    proxy_.reset();
+    if (proxy_ == nullptr) return;
+    (void)proxy_->stopRangingSession(kSessionId);
+    // The controller goes on the service thread, once it is done with it.
+    harness_.RunOnService([this] { proxy_.reset(); });
   }
 
   const std::string& error() const { return error_; }

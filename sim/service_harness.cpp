@@ -63,6 +63,11 @@ bool ServiceHarness::Start(std::string* error) {
 }
 
 void ServiceHarness::RunOnService(const std::function<void()>& task) {
+  // Not serving: the calling thread is the only one.
+  if (!thread_.joinable()) {
+    task();
+    return;
+  }
   std::promise<void> done;
   event_loop_->PostTask([&task, &done] {
     task();

@@ -51,7 +51,8 @@ class ServiceHarness {
   // Creates the interfaces, starts the simulator and the service thread, and
   // resolves the families. False, with the reason in |error|, on failure.
   bool Start(std::string* error);
-  // Runs |task| on the service thread and returns once it ran.
+  // Runs |task| on the service thread and returns once it ran; runs it at
+  // once when the harness does not serve.
   void RunOnService(const std::function<void()>& task);
 
   // Service thread only.

@@ -41,6 +41,11 @@ class FiraControllerE2eTest : public ::testing::Test {
       ASSERT_TRUE(proxy->setSessionCallback(callbacks_.back()).isOk());
     }
   }
+  // The controllers go on the service thread, once it is done with them.
+  void TearDown() override {
+    if (harness_ != nullptr) harness_->RunOnService([this] { proxies_.clear(); });
+  }
+
   // A session ranging every 20 ms with |peers|, which the world places on a
   // circle, a line and a spot around the radio.
   uwb::FiraTwrSession MovingPeers(int32_t id, const std::vector<uint16_t>& peers) {

@@ -16,6 +16,7 @@
 
 #include "net/fira_region.h"
 #include "sim/fira_notification.h"
+#include "tests/fira_callback_recorder.h"
 #include "tests/log_capture.h"
 #include "tests/mock_nl_socket.h"
 #include "tests/sent_message.h"
@@ -42,16 +43,6 @@ using Attrs = std::map<int, std::vector<uint8_t>>;
 constexpr uint32_t kFamily = 0x1d;
 constexpr uint32_t kHw = 3;
 constexpr char kTag[] = "dalix.uwb.FiraRegionUtils";
-
-struct Recorder : FiraCallback {
-  void OnTwrResult(const FiraRangingData& data,
-                   const std::vector<FiraTwrMeasurement>& measurements) override {
-    results.push_back({data, measurements});
-  }
-  void OnSessionStopped(uint32_t session_id) override { stopped.push_back(session_id); }
-  std::vector<std::pair<FiraRangingData, std::vector<FiraTwrMeasurement>>> results;
-  std::vector<uint32_t> stopped;
-};
 
 // A session parameter as it goes on the wire.
 std::vector<uint8_t> Param(int attr, uint32_t value) {
@@ -173,7 +164,7 @@ class FiraRegionUtilsTest : public ::testing::Test {
   std::vector<SentMessage> sent_;
   ConfigUtils config_;
   LogCapture log_;
-  Recorder recorder_;
+  FiraCallbackRecorder recorder_;
 };
 
 TEST_F(FiraRegionUtilsTest, ConfigTwrSessionSendsExactlyTheParametersTheSessionCallsFor) {

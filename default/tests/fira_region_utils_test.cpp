@@ -325,7 +325,9 @@ TEST_F(FiraRegionUtilsTest, CallsCarryTheirIdSessionAndParameters) {
     std::vector<nlattr*> params = CallParams(c.call);
     ASSERT_EQ(params.size(), c.second.empty() ? 1u : 2u) << static_cast<int>(c.call);
     EXPECT_EQ(SentMessage::Payload(params[0]), SentMessage::Bytes<uint32_t>(9));
-    if (!c.second.empty()) EXPECT_EQ(SentMessage::Payload(params[1]), c.second);
+    if (!c.second.empty()) {
+      EXPECT_EQ(SentMessage::Payload(params[1]), c.second);
+    }
   }
   ExpectSocket(false);
   EXPECT_FALSE(fira_.InitSession(kHw, 9));
@@ -559,7 +561,9 @@ TEST_F(FiraRegionUtilsTest, NotificationsDecodeIntoResultsOrAreDroppedWithTheirL
   for (const auto& [notification, text] : dropped) {
     log_.Reset();
     EXPECT_TRUE(Decode(notification).empty()) << text;
-    if (!text.empty()) EXPECT_EQ(log_.Entries().back().message, "OnRangingResult: " + text);
+    if (!text.empty()) {
+      EXPECT_EQ(log_.Entries().back().message, "OnRangingResult: " + text);
+    }
   }
   EXPECT_EQ(recorder_.stopped, std::vector<uint32_t>{77});
 }

@@ -26,6 +26,7 @@ class FiraClientCallback : public aidl::hardware::dalix::uwb::BnFiraSessionCallb
   struct Result {
     aidl::hardware::dalix::uwb::FiraRangingData data;
     std::vector<aidl::hardware::dalix::uwb::FiraTwrMeasurement> measurements;
+    size_t arrival = 0;  // 1 for the first result received
   };
 
   ndk::ScopedAStatus onTwrResult(
@@ -75,7 +76,7 @@ class FiraClientCallback : public aidl::hardware::dalix::uwb::BnFiraSessionCallb
     events_.push_back(name + std::to_string(id) + (reason != 0 ? "?" : ""));
     if (result.has_value()) {
       last_result_ = std::move(*result);
-      ++results_;
+      last_result_.arrival = ++results_;
     }
     changed_.notify_all();
     // The service must not care what a client answers.

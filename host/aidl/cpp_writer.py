@@ -226,15 +226,18 @@ class CppWriter:
         return decl.methods + [Method('getInterfaceVersion', int_ref, [], decl.line),
                                Method('getInterfaceHash', string_ref, [], decl.line)]
 
-    def param_decl(self, param: Param) -> str:
+    def param_decl(self, param: Param, unused: bool = False) -> str:
+        name = ('/*%s*/' if unused else '%s') % (('out_' if param.direction == 'out' else 'in_')
+                                               + param.name)
         if param.direction == 'out':
-            return '%s* out_%s' % (self.cpp_type(param.type), param.name)
-        return '%s in_%s' % (self.in_type(param.type), param.name)
+            return '%s* %s' % (self.cpp_type(param.type), name)
+        return '%s %s' % (self.in_type(param.type), name)
 
-    def signature(self, method: Method, qualifier: str = '') -> str:
-        params = [self.param_decl(p) for p in method.params]
+    def signature(self, method: Method, qualifier: str = '', unused: bool = False) -> str:
+        params = [self.param_decl(p, unused) for p in method.params]
         if method.return_type is not None:
-            params.append('%s* _aidl_return' % self.cpp_type(method.return_type))
+            params.append('%s* %s' % (self.cpp_type(method.return_type),
+                                      '/*_aidl_return*/' if unused else '_aidl_return'))
         return '::ndk::ScopedAStatus %s%s(%s)' % (qualifier, method.name, ', '.join(params))
 
     def interface_header(self, decl: Declaration) -> str:
@@ -264,9 +267,35 @@ class CppWriter:
                   '']
         for method in self.all_methods(decl):
             lines.append('  virtual %s = 0;' % self.signature(method))
-        lines += ['};', '']
+        lines += ['};', '',
+                  '// Answers every operation as unknown to the remote side; version 0, no hash.',
+                  'class %s : public %s {' % (self.default_name(name), name), ' public:']
+        for method in self.all_methods(decl):
+            lines.append('  %s override;' % self.signature(method))
+        lines += ['  ::ndk::SpAIBinder asBinder() override;', '  bool isRemote() override;', '};',
+                  '']
         lines += self.close_namespace()
         return self.join(lines)
+
+    @staticmethod
+    def default_name(name: str) -> str:
+        return name + 'Default'
+
+    def default_source(self, decl: Declaration) -> List[str]:
+        default = self.default_name(decl.name)
+        lines = []
+        for method in self.all_methods(decl):
+            unused = method.name not in ('getInterfaceVersion', 'getInterfaceHash')
+            lines.append('%s {' % self.signature(method, default + '::', unused))
+            if method.name == 'getInterfaceVersion':
+                lines += ['  *_aidl_return = 0;', '  return ::ndk::ScopedAStatus::ok();']
+            elif method.name == 'getInterfaceHash':
+                lines += ['  *_aidl_return = "";', '  return ::ndk::ScopedAStatus::ok();']
+            else:
+                lines += ['  return ::ndk::ScopedAStatus::fromStatus(STATUS_UNKNOWN_TRANSACTION);']
+            lines += ['}', '']
+        return lines + ['::ndk::SpAIBinder %s::asBinder() { return ::ndk::SpAIBinder(); }' % default,
+                        'bool %s::isRemote() { return false; }' % default, '']
 
     def bn_header(self, decl: Declaration) -> str:
         bn = self.bn_name(decl.name)
@@ -403,5 +432,6 @@ class CppWriter:
                   '%s::~%s() = default;' % (bp, bp), '']
         for method in self.all_methods(decl):
             lines += self.proxy_method(decl, method)
+        lines += self.default_source(decl)
         lines += self.close_namespace()
         return self.join(lines)

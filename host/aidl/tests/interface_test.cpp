@@ -1,9 +1,10 @@
 #include <poll.h>
 
-#include <algorithm>
 #include <atomic>
 #include <cstring>
 #include <iterator>
+#include <tuple>
+#include <utility>
 #include <functional>
 #include <memory>
 #include <string>
@@ -71,7 +72,7 @@ class TestUwb : public uwb::BnUwb {
 
   std::vector<std::thread::id> callers;
   std::vector<std::string> iface_names = {"uwb0", "uwb1"};
-  std::function<ScopedAStatus()> close_status = [] {
+  ScopedAStatus (*close_status)() = [] {
     return ScopedAStatus::fromServiceSpecificErrorWithMessage(1, "Netlink failure");
   };
   std::shared_ptr<uwb::IUwbClientCallback> client;
@@ -162,72 +163,54 @@ TEST_F(InterfaceTest, ClientCallsRunOnTheServiceThreadWithTheirResults) {
 
 // What a real process boundary refuses or strips, the emulated one does too.
 TEST_F(InterfaceTest, CallsFailAsTheyWouldCrossingAProcessBoundary) {
-  // The request's fixed part: token header, descriptor, the int64 and the
-  // string's length and terminator; each character of the path adds 2 bytes.
+  // Request: token header, descriptor, int64, then the path's length, its
+  // UTF-16 characters and terminator.
   const size_t fixed = 12 + 4 + (std::strlen(uwb::IUwb::descriptor) + 1) * 2 + 8 + 4 + 2;
   const size_t fits = (ndk::host::ParcelCheck::kMaxTransactionBytes - fixed) / 2 - 1;
-  const struct {
-    const char* name;
-    std::string path;
-    binder_status_t status;  // what the caller sees; OK when the call ran
-  } requests[] = {
-      {"valid multi-byte text", "/tmp/caf\xc3\xa9-\xf0\x9f\x93\xa1", STATUS_OK},
-      {"stray continuation byte", "/tmp/\x80", STATUS_BAD_VALUE},
-      {"truncated sequence", "/tmp/\xe2\x82", STATUS_BAD_VALUE},
-      {"overlong slash", "/tmp\xc0\xaf", STATUS_BAD_VALUE},
-      {"surrogate", "\xed\xa0\x80", STATUS_BAD_VALUE},
-      {"largest request", std::string(fits, 'a'), STATUS_OK},
-      {"one character more", std::string(fits + 2, 'a'), STATUS_FAILED_TRANSACTION},
+  const std::pair<std::string, binder_status_t> paths[] = {
+      {"caf\xc3\xa9 \xf0\x9f\x93\xa1", STATUS_OK},  {"stray \x80", STATUS_BAD_VALUE},
+      {"truncated \xe2\x82", STATUS_BAD_VALUE},         {"overlong \xc0\xaf", STATUS_BAD_VALUE},
+      {"surrogate \xed\xa0\x80", STATUS_BAD_VALUE},    {std::string(fits, 'a'), STATUS_OK},
+      {std::string(fits + 2, 'a'), STATUS_FAILED_TRANSACTION},
   };
-  const struct {
-    const char* name;
-    std::function<ScopedAStatus()> answer;
-    binder_exception_t exception;
-    binder_status_t status;
-    const char* message;
-  } answers[] = {
-      {"failed transaction with a message",
-       [] { return ScopedAStatus::fromExceptionCodeWithMessage(EX_TRANSACTION_FAILED, "x"); },
-       EX_TRANSACTION_FAILED, STATUS_FAILED_TRANSACTION, ""},
-      {"transport status", [] { return ScopedAStatus::fromStatus(STATUS_NO_MEMORY); },
-       EX_TRANSACTION_FAILED, STATUS_NO_MEMORY, ""},
-      {"exception with a message",
-       [] { return ScopedAStatus::fromExceptionCodeWithMessage(EX_ILLEGAL_STATE, "busy"); },
-       EX_ILLEGAL_STATE, STATUS_OK, "busy"},
-  };
+  // Answers of close(): exception, transport status and message as the caller sees them.
+  const std::tuple<ScopedAStatus (*)(), binder_exception_t, binder_status_t, const char*>
+      answers[] = {
+          {[] { return ScopedAStatus::fromExceptionCodeWithMessage(EX_TRANSACTION_FAILED, "x"); },
+           EX_TRANSACTION_FAILED, STATUS_FAILED_TRANSACTION, ""},
+          {[] { return ScopedAStatus::fromStatus(STATUS_NO_MEMORY); }, EX_TRANSACTION_FAILED,
+           STATUS_NO_MEMORY, ""},
+          {[] { return ScopedAStatus::fromExceptionCodeWithMessage(EX_ILLEGAL_STATE, "busy"); },
+           EX_ILLEGAL_STATE, STATUS_OK, "busy"},
+      };
   service_->iface_names = {"uwb0", "\xff"};
-  std::vector<ScopedAStatus> request_results, answer_results;
-  ScopedAStatus bad_reply;
+  std::vector<ScopedAStatus> results;
   std::vector<std::string> names = {"kept"};
   RunClient([&] {
     std::shared_ptr<uwb::IUwb> proxy = Lookup(instance_);
-    for (const auto& r : requests) request_results.push_back(proxy->loadCalibration(1, r.path));
-    for (const auto& a : answers) {
-      service_->close_status = a.answer;  // read by the service thread while this one waits
-      answer_results.push_back(proxy->close());
+    for (const auto& [path, _] : paths) results.push_back(proxy->loadCalibration(1, path));
+    for (const auto& answer : answers) {
+      service_->close_status = std::get<0>(answer);  // read while this thread waits
+      results.push_back(proxy->close());
     }
-    bad_reply = proxy->listIfaceNames(&names);
+    results.push_back(proxy->listIfaceNames(&names));
   });
-  for (size_t i = 0; i < std::size(requests); ++i) {
-    SCOPED_TRACE(requests[i].name);
-    const ScopedAStatus& result = request_results[i];
-    // A refused request never reaches the service; one that ran answers
-    // with its own exception.
-    EXPECT_EQ(requests[i].status == STATUS_OK ? EX_ILLEGAL_ARGUMENT : EX_TRANSACTION_FAILED,
-              result.getExceptionCode());
-    if (requests[i].status != STATUS_OK) EXPECT_EQ(requests[i].status, result.getStatus());
+  ASSERT_EQ(std::size(paths) + std::size(answers) + 1, results.size());
+  size_t i = 0;
+  for (const auto& [path, refused_with] : paths) {
+    // A refused request fails without reaching the service, which would
+    // answer EX_ILLEGAL_ARGUMENT.
+    SCOPED_TRACE(path.substr(0, 20));
+    EXPECT_EQ(refused_with, results[i].getStatus());
+    EXPECT_EQ(refused_with == STATUS_OK, results[i++].getExceptionCode() == EX_ILLEGAL_ARGUMENT);
   }
-  const auto refused = std::count_if(std::begin(requests), std::end(requests),
-                                     [](const auto& r) { return r.status != STATUS_OK; });
-  EXPECT_EQ(std::size(requests) - refused + std::size(answers) + 1, service_->callers.size());
-  for (size_t i = 0; i < std::size(answers); ++i) {
-    SCOPED_TRACE(answers[i].name);
-    EXPECT_EQ(answers[i].exception, answer_results[i].getExceptionCode());
-    EXPECT_EQ(answers[i].status, answer_results[i].getStatus());
-    EXPECT_STREQ(answers[i].message, answer_results[i].getMessage());
+  for (const auto& [_, exception, transport, message] : answers) {
+    EXPECT_EQ(exception, results[i].getExceptionCode());
+    EXPECT_EQ(transport, results[i].getStatus());
+    EXPECT_STREQ(message, results[i++].getMessage());
   }
-  EXPECT_EQ(STATUS_BAD_VALUE, bad_reply.getStatus());
-  EXPECT_EQ(std::vector<std::string>{"kept"}, names) << "a reply that cannot be sent is lost";
+  EXPECT_EQ(STATUS_BAD_VALUE, results[i].getStatus()) << "a reply that cannot be written";
+  EXPECT_EQ(std::vector<std::string>{"kept"}, names);
 }
 
 }  // namespace

@@ -2,16 +2,8 @@
 
 #include <gtest/gtest.h>
 
-namespace hardware {
-namespace dalix {
-namespace {
-
 // Built with the binder library and without any (where the weak
 // declarations stay null, as on a device whose library lacks the calls).
 TEST(BinderPollingTest, AvailableExactlyWhenBothCallsResolved) {
-  EXPECT_EQ(DALIX_BINDER_LINKED != 0, BinderPollingAvailable());
+  EXPECT_EQ(DALIX_BINDER_LINKED != 0, hardware::dalix::BinderPollingAvailable());
 }
-
-}  // namespace
-}  // namespace dalix
-}  // namespace hardware

@@ -57,10 +57,6 @@ class GeneratorTest(unittest.TestCase):
              "'int x' can be an in parameter only"),
             ('ITwice', 'interface ITwice {\n    void f(int x, long x);\n}\n', 4,
              "method 'f' has duplicate argument name 'x'"),
-            ('IGone', 'interface IGone {\n    void f(CharSequence s);\n}\n', 4,
-             'type CharSequence is not supported by the NDK back end'),
-            ('Doubled', 'parcelable Doubled {\n    int a;\n    int a;\n}\n', 5,
-             'field a is declared twice'),
             ('Lonely', 'import aidl.hardware.dalix.uwb.Missing;\n@VintfStability\n'
              'parcelable Lonely {\n}\n', 2,
              "Couldn't find import for class aidl.hardware.dalix.uwb.Missing"),

@@ -180,8 +180,6 @@ TEST_F(InterfaceTest, CallsFailAsTheyWouldCrossingAProcessBoundary) {
            EX_TRANSACTION_FAILED, STATUS_FAILED_TRANSACTION, ""},
           {[] { return ScopedAStatus::fromStatus(STATUS_NO_MEMORY); }, EX_TRANSACTION_FAILED,
            STATUS_NO_MEMORY, ""},
-          {[] { return ScopedAStatus::fromExceptionCodeWithMessage(EX_ILLEGAL_STATE, "busy"); },
-           EX_ILLEGAL_STATE, STATUS_OK, "busy"},
       };
   service_->iface_names = {"uwb0", "\xff"};
   std::vector<ScopedAStatus> results;

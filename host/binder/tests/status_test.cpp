@@ -31,7 +31,6 @@ TEST(StatusTest, EachConstructorReportsItsPartsAndDescription) {
     std::string description;
   } cases[] = {
       {ScopedAStatus::ok(), EX_NONE, 0, STATUS_OK, "", "No error"},
-      {ScopedAStatus::fromExceptionCode(EX_NONE), EX_NONE, 0, STATUS_OK, "", "No error"},
       {ScopedAStatus::fromStatus(STATUS_OK), EX_NONE, 0, STATUS_OK, "", "No error"},
       {ScopedAStatus::fromExceptionCodeWithMessage(EX_ILLEGAL_ARGUMENT, "bad"),
        EX_ILLEGAL_ARGUMENT, 0, STATUS_OK, "bad", "Status(-3, EX_ILLEGAL_ARGUMENT): 'bad'"},
@@ -39,8 +38,6 @@ TEST(StatusTest, EachConstructorReportsItsPartsAndDescription) {
        EX_UNSUPPORTED_OPERATION, 0, STATUS_OK, "", "Status(-7, EX_UNSUPPORTED_OPERATION): ''"},
       {ScopedAStatus::fromExceptionCode(EX_TRANSACTION_FAILED), EX_TRANSACTION_FAILED, 0,
        STATUS_FAILED_TRANSACTION, "", "Status(-129, EX_TRANSACTION_FAILED): 'FAILED_TRANSACTION: '"},
-      {ScopedAStatus::fromExceptionCodeWithMessage(-128, "x"), -128, 0, STATUS_OK, "x",
-       "Status(-128, EX_HAS_REPLY_HEADER): 'x'"},
       {ScopedAStatus::fromExceptionCode(-42), -42, 0, STATUS_OK, "", "Status(-42, -42): ''"},
       {ScopedAStatus::fromStatus(-EIO), EX_TRANSACTION_FAILED, 0, -EIO, "",
        "Status(-129, EX_TRANSACTION_FAILED): '-5 (Input/output error): '"},

@@ -2,6 +2,7 @@
 // (cmake/compile_fail.cmake); case 0 is the same code done right.
 #include <memory>
 #include <type_traits>
+#include <utility>
 
 #include <android/binder_auto_utils.h>
 #include <android/binder_manager.h>
@@ -35,14 +36,12 @@ int main() {
   ndk::ScopedAStatus status = ndk::ScopedAStatus::ok();
   ndk::ScopedAIBinder_Weak weak(AIBinder_Weak_new(binder.get()));
   ndk::ScopedAIBinder_DeathRecipient recipient(AIBinder_DeathRecipient_new(OnDied));
-  const auto& fixed_thing = *thing;
-  const auto& fixed_weak = weak;
 #if DALIX_CASE == 3
   delete new Thing();
 #elif DALIX_CASE == 4
   std::make_unique<Thing>();
 #elif DALIX_CASE == 5
-  fixed_thing.ref<Thing>();
+  std::as_const(*thing).ref<Thing>();
 #elif DALIX_CASE == 6
   AIBinder_decStrong(binder.release());
 #elif DALIX_CASE == 7
@@ -52,7 +51,7 @@ int main() {
 #elif DALIX_CASE == 9
   AIBinder_DeathRecipient_delete(recipient.release());
 #elif DALIX_CASE == 10
-  fixed_weak.promote();
+  std::as_const(weak).promote();
 #elif DALIX_CASE == 11
   return EX_HAS_REPLY_HEADER;
 #elif DALIX_CASE == 12
@@ -76,6 +75,5 @@ int main() {
   (void)ndk::ScopedAStatus::fromExceptionCode(EX_ILLEGAL_STATE);
   ndk::SpAIBinder promoted = weak.promote();
 #endif
-  (void)fixed_thing, (void)fixed_weak;
   return status.isOk() ? 0 : 1;
 }

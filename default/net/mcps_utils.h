@@ -47,6 +47,8 @@ class McpsUtils {
     kInitiator = 0,
     kResponder = 1,
   };
+  // The generated types by their own namespace: the service's shorter alias
+  // lives in uwb_aidl.h, which this header must stay includable beside.
   using RangingRequest = ::aidl::aidl::hardware::dalix::uwb::RangingRequest;
   using RangingResult = ::aidl::aidl::hardware::dalix::uwb::RangingResult;
   using RangingResultHandler = std::function<void(const RangingResult&)>;

@@ -6,21 +6,12 @@
 #include <string>
 #include <vector>
 
+#include <aidl/aidl/hardware/dalix/uwb/RangingRequest.h>
+#include <aidl/aidl/hardware/dalix/uwb/RangingResult.h>
 #include <netlink/msg.h>
 
 #include "net/config_utils.h"
 #include "net/nl_socket_factory.h"
-
-namespace aidl {
-namespace hardware {
-namespace dalix {
-namespace uwb {
-class RangingRequest;
-class RangingResult;
-}  // namespace uwb
-}  // namespace dalix
-}  // namespace hardware
-}  // namespace aidl
 
 namespace hardware {
 namespace dalix {
@@ -56,8 +47,10 @@ class McpsUtils {
     kInitiator = 0,
     kResponder = 1,
   };
-  using RangingRequest = aidl::hardware::dalix::uwb::RangingRequest;
-  using RangingResult = aidl::hardware::dalix::uwb::RangingResult;
+  // The generated types by their own namespace: the service's shorter alias
+  // lives in uwb_aidl.h, which this header must stay includable beside.
+  using RangingRequest = ::aidl::aidl::hardware::dalix::uwb::RangingRequest;
+  using RangingResult = ::aidl::aidl::hardware::dalix::uwb::RangingResult;
   using RangingResultHandler = std::function<void(const RangingResult&)>;
 
   explicit McpsUtils(NlSocketFactory* socket_factory);

@@ -8,6 +8,7 @@
 #include <memory>
 #include <string>
 #include <tuple>
+#include <type_traits>
 #include <utility>
 #include <vector>
 
@@ -21,6 +22,7 @@
 #include "tests/log_capture.h"
 #include "tests/mock_nl_socket.h"
 #include "tests/sent_message.h"
+#include "uwb_aidl.h"
 
 namespace hardware {
 namespace dalix {
@@ -38,6 +40,11 @@ using ::testing::StrictMock;
 constexpr uint32_t kFamily = 0x1d;
 constexpr uint32_t kHw = 3;
 constexpr char kTag[] = "dalix.uwb.McpsUtils";
+
+// The driver client and the HAL objects must name the same request and result
+// types, with both headers in one translation unit.
+static_assert(std::is_same_v<McpsUtils::RangingRequest, aidl::hardware::dalix::uwb::RangingRequest>);
+static_assert(std::is_same_v<McpsUtils::RangingResult, aidl::hardware::dalix::uwb::RangingResult>);
 
 class McpsUtilsTest : public ::testing::Test {
  protected:

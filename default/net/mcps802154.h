@@ -121,6 +121,10 @@ enum Mcps802154RangingResultAttr : int {
 };
 
 constexpr int kMcpsPdoaFractionalBits = 11;
+// The radio geometry that relates a phase difference to an angle of arrival:
+// angle = asin(phase difference * wavelength / (2 pi * antenna spacing)).
+constexpr float kMcpsCarrierWavelengthMetres = 0.046108086f;
+constexpr float kMcpsAntennaSpacingMetres = 0.0208f;
 // What a ranging report carries for a value the driver did not measure.
 constexpr int32_t kMcpsRangingValueAbsent = INT32_MIN;
 

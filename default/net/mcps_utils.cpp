@@ -84,17 +84,15 @@ void OnCalibrationReply(nl_msg* msg, int* status) {
 // precision except for the division by 2 pi.
 float phase_to_rad(int32_t phase) {
   constexpr float kFixedPointScale = 0.00048828125f;  // 2^-11
-  constexpr float kWavelengthMetres = 0.046108086f;
   constexpr double kTwoPi = 6.283185307179586;
-  constexpr float kAntennaSpacingMetres = 0.0208f;
   static_assert(kFixedPointScale == 1.0f / (1 << kMcpsPdoaFractionalBits));
 
   // The absent-value marker, and anything else below the smallest phase.
   if (phase < -32767) return std::numeric_limits<float>::quiet_NaN();
   float x = static_cast<float>(phase) * kFixedPointScale;
-  x *= kWavelengthMetres;
+  x *= kMcpsCarrierWavelengthMetres;
   x = static_cast<float>(static_cast<double>(x) / kTwoPi);
-  x /= kAntennaSpacingMetres;
+  x /= kMcpsAntennaSpacingMetres;
   x = std::clamp(x, -1.0f, 1.0f);
   return asinf(x);
 }

@@ -65,8 +65,8 @@ ndk::ScopedAStatus CccController::onOpenCccSessionDone() {
   return ndk::ScopedAStatus::ok();
 }
 
-ndk::ScopedAStatus CccController::startCccSession(int32_t first, int64_t timeref,
-                                                  int32_t channel, int64_t* result) {
+ndk::ScopedAStatus CccController::startCccSession(int32_t first, int64_t timeref, int32_t channel,
+                                                  int64_t* result) {
   LOG(INFO) << __func__;
   if (timeref < 0) return IllegalArgument("Timeref cannot be negative");
   ndk::ScopedAStatus status = CheckUwbChannelRange(channel);

@@ -15,7 +15,11 @@ bool CccTestModeSim::EncodeTestModeReply(nl_msg* msg, uint32_t hw_index,
                                          std::optional<uint8_t> return_code) {
   if (nla_put_u32(msg, MCPS802154_ATTR_HW, hw_index) != 0) return false;
   nlattr* testdata = nla_nest_start(msg, MCPS802154_ATTR_TESTDATA | NLA_F_NESTED);
-  if (testdata == nullptr) return false;
+  // The command is echoed, so the test data is there even without a code.
+  if (testdata == nullptr ||
+      nla_put_u32(msg, KX7200_TM_ATTR_CMD, KX7200_TM_CMD_CCC_START_SESSION) != 0) {
+    return false;
+  }
   if (return_code && nla_put_u8(msg, KX7200_TM_ATTR_CCC_CMD_RC, *return_code) != 0) return false;
   return nla_nest_end(msg, testdata) == 0;
 }

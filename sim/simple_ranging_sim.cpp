@@ -21,8 +21,8 @@ SimpleRangingSim::SimpleRangingSim(DriverSimulator* simulator, RadioStore* radio
     : simulator_(simulator), radios_(radios), devices_(devices), peers_(peers) {}
 
 int32_t SimpleRangingSim::AngleToPhase(double angle_rad) {
-  const double pdoa_rad = std::sin(angle_rad) * 2 * M_PI * kMcpsAntennaSpacingMetres /
-                          kMcpsCarrierWavelengthMetres;
+  const double pdoa_rad =
+      std::sin(angle_rad) * 2 * M_PI * kMcpsAntennaSpacingMetres / kMcpsCarrierWavelengthMetres;
   const double fixed = std::round(pdoa_rad * (1 << kMcpsPdoaFractionalBits));
   return static_cast<int32_t>(std::fmax(-32767.0, std::fmin(32767.0, fixed)));
 }

@@ -23,8 +23,8 @@ bool CccRegionUtils::StartRegionMessage(nl_msg* msg, uint32_t hw_index, uint8_t 
     LOG(ERROR) << __func__ << ": MCPS netlink id is not resolved";
     return false;
   }
-  if (genlmsg_put(msg, NL_AUTO_PORT, NL_AUTO_SEQ, mcps_net_id_, 0, 0, MCPS802154_CMD_TESTMODE,
-                  0) == nullptr ||
+  if (genlmsg_put(msg, NL_AUTO_PORT, NL_AUTO_SEQ, mcps_net_id_, 0, 0, MCPS802154_CMD_TESTMODE, 0) ==
+          nullptr ||
       nla_put_u32(msg, MCPS802154_ATTR_HW, hw_index) != 0) {
     return false;
   }
@@ -32,9 +32,8 @@ bool CccRegionUtils::StartRegionMessage(nl_msg* msg, uint32_t hw_index, uint8_t 
   return *testdata != nullptr && nla_put_u32(msg, KX7200_TM_ATTR_CMD, cmd) == 0;
 }
 
-bool CccRegionUtils::StartCccSession(uint32_t hw_index, uint32_t /*first*/,
-                                     uint64_t /*timeref*/, uint8_t channel,
-                                     uint32_t* u32_param) {
+bool CccRegionUtils::StartCccSession(uint32_t hw_index, uint32_t /*first*/, uint64_t /*timeref*/,
+                                     uint8_t channel, uint32_t* u32_param) {
   LOG(INFO) << __func__;
   UniqueNlMsg msg;
   nlattr* testdata = nullptr;

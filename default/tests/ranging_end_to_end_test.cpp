@@ -51,40 +51,31 @@ class FixedPeers : public sim::PeerAngleSource {
   }
 };
 
+// Keeps each request's first result; counts them all.
 class RecordingCallback : public uwb::BnSimpleRangingCallback {
  public:
   ndk::ScopedAStatus onRangingResult(const uwb::RangingResult& result) override {
     std::lock_guard<std::mutex> lock(mutex_);
-    results_[result.id].push_back(result);
+    first_.emplace(result.id, result);
+    ++count_;
     changed_.notify_all();
     return ndk::ScopedAStatus::ok();
   }
-  int Count() {
-    std::lock_guard<std::mutex> lock(mutex_);
-    int count = 0;
-    for (const auto& [id, results] : results_) count += static_cast<int>(results.size());
-    return count;
-  }
-  // The first result of each of |ids|, once every one has come.
-  std::map<int32_t, uwb::RangingResult> WaitForEach(const std::vector<int32_t>& ids) {
+  std::map<int32_t, uwb::RangingResult> WaitForFirst(size_t requests) {
     std::unique_lock<std::mutex> lock(mutex_);
-    std::map<int32_t, uwb::RangingResult> first;
-    changed_.wait_for(lock, std::chrono::seconds(5), [&] {
-      for (int32_t id : ids) {
-        if (results_[id].empty()) return false;
-      }
-      return true;
-    });
-    for (int32_t id : ids) {
-      if (!results_[id].empty()) first[id] = results_[id].front();
-    }
-    return first;
+    changed_.wait_for(lock, std::chrono::seconds(5), [&] { return first_.size() == requests; });
+    return first_;
+  }
+  int count() {
+    std::lock_guard<std::mutex> lock(mutex_);
+    return count_;
   }
 
  private:
   std::mutex mutex_;
   std::condition_variable changed_;
-  std::map<int32_t, std::vector<uwb::RangingResult>> results_;
+  std::map<int32_t, uwb::RangingResult> first_;
+  int count_ = 0;
 };
 
 class RangingEndToEndTest : public ::testing::Test {
@@ -188,7 +179,7 @@ TEST_F(RangingEndToEndTest, BothModesDeliverTheAnglesOfTheSimulatedPeers) {
 
     ASSERT_TRUE(
         simple_->setRangings({Request(1, kPeerA), Request(2, kPeerB), Request(3, kNobody)}).isOk());
-    std::map<int32_t, uwb::RangingResult> first = callback->WaitForEach({1, 2, 3});
+    std::map<int32_t, uwb::RangingResult> first = callback->WaitForFirst(3);
     ASSERT_EQ(first.size(), 3u);
     // One fixed-point step of phase is about 2e-4 rad of angle near the axis.
     const struct {
@@ -210,9 +201,9 @@ TEST_F(RangingEndToEndTest, BothModesDeliverTheAnglesOfTheSimulatedPeers) {
     ASSERT_TRUE(simple_->stop().isOk());
     EXPECT_FALSE(devices_.FindByName(kIface)->up);
     // The reports end with the ranging socket: nothing more reaches the client.
-    const int delivered = callback->Count();
+    const int delivered = callback->count();
     std::this_thread::sleep_for(std::chrono::milliseconds(100));
-    EXPECT_EQ(callback->Count(), delivered);
+    EXPECT_EQ(callback->count(), delivered);
   }
 }
 

@@ -15,13 +15,14 @@
 #include <linux/netlink.h>
 
 #include "net/mcps802154.h"
-#include "simple_ranging_controller.h"
 #include "sim/driver_simulator.h"
 #include "sim/mcps_family.h"
 #include "sim/private_namespace.h"
 #include "sim/sim_interface_tool.h"
 #include "sim/sim_nl_socket_factory.h"
 #include "sim/simple_ranging_sim.h"
+#include "sim/world.h"
+#include "simple_ranging_controller.h"
 
 namespace hardware {
 namespace dalix {
@@ -56,17 +57,10 @@ class CountingCallback : public uwb::BnSimpleRangingCallback {
   int64_t count_ = 0;
 };
 
-// Nobody in reach: the simulator's own reports stay out of the measurement,
-// as does its ticking, since the radio has no interface up.
-class NoPeers : public sim::PeerAngleSource {
- public:
-  std::optional<sim::PeerObservation> Observe(uint32_t, uint64_t) override { return {}; }
-};
-
 class RangingSession {
  public:
   RangingSession()
-      : ranging_(&simulator_, &radios_, &devices_, &peers_),
+      : ranging_(&simulator_, &radios_, &devices_, &world_),
         factory_(&loop_, simulator_.port()),
         mcps_(&factory_),
         tool_(&devices_) {
@@ -109,7 +103,9 @@ class RangingSession {
 
   sim::RadioStore radios_;
   sim::WpanDeviceStore devices_;
-  NoPeers peers_;
+  // Empty, and the radio has no interface up: the simulator's own reports
+  // and its ticking stay out of the measurement.
+  sim::World world_;
   sim::McpsFamily family_{&radios_};
   sim::DriverSimulator simulator_;
   sim::SimpleRangingSim ranging_;

@@ -14,8 +14,8 @@ namespace sim = hardware::dalix::sim;
 // Replies as the simulated driver encodes them: success, failure, no code.
 bool WriteSeeds(hardware::dalix::fuzz::SeedRecorder& recorder) {
   bool written = true;
-  for (std::optional<uint8_t> code : {std::optional<uint8_t>(1), std::optional<uint8_t>(0),
-                                      std::optional<uint8_t>()}) {
+  for (std::optional<uint8_t> code :
+       {std::optional<uint8_t>(1), std::optional<uint8_t>(0), std::optional<uint8_t>()}) {
     UniqueNlMsg msg = sim::DriverSimulator::NewEvent(0x1a, MCPS802154_CMD_TESTMODE);
     std::vector<uint8_t> seed;
     if (sim::CccTestModeSim::EncodeTestModeReply(msg.get(), 0, code)) {

@@ -334,6 +334,15 @@ TEST_F(McpsUtilsTest, ReportsReachTheFirstRequestOfTheirIdOnly) {
   Deliver({8u, 5u, 0, 0});
   Deliver({1u, 5u, 0, 0}, MCPS802154_CMD_NEW_HW);
   Deliver({std::nullopt, 5u, 0, 0});
+  // A phase shorter than its 4 bytes is refused, not read past.
+  UniqueNlMsg short_phase = sim::DriverSimulator::NewEvent(kFamily, MCPS802154_CMD_RANGING_REPORT);
+  nla_put_u32(short_phase.get(), MCPS802154_ATTR_HW, kHw);
+  nlattr* result = nla_nest_start(short_phase.get(), MCPS802154_ATTR_RANGING_RESULT);
+  nla_put_u32(short_phase.get(), MCPS802154_RANGING_RESULT_ATTR_REQUEST_ID, 1);
+  nla_put_u16(short_phase.get(), MCPS802154_RANGING_RESULT_ATTR_PDOA_2, 7);
+  nla_nest_end(short_phase.get(), result);
+  on_report_(short_phase.get());
+  EXPECT_EQ(log_.Count(WARNING, "OnRangingResult: Failed to parse nested attr", kTag), 1);
   ASSERT_EQ(results_.size(), 1u);
   EXPECT_EQ(results_[0].peerAddress, 10);
   EXPECT_EQ(log_.Count(WARNING, "OnRangingResult: Received result for unknown request", kTag), 1);

@@ -98,7 +98,7 @@ uint32_t McpsUtils::GetNetId() const { return net_id_; }
 std::vector<McpsHwInfo> McpsUtils::ListHardware(bool* ok) {
   LOG(INFO) << __func__;
   std::vector<McpsHwInfo> radios;
-  UniqueNlMsg msg;
+  UniqueNlMsg msg(LOG_TAG);
   // A dump request carries no hardware index, so SetMcpsCommand does not apply.
   genlmsg_put(msg.get(), NL_AUTO_PORT, NL_AUTO_SEQ, net_id_, 0, NLM_F_DUMP,
               MCPS802154_CMD_GET_HW, 0);
@@ -108,21 +108,22 @@ std::vector<McpsHwInfo> McpsUtils::ListHardware(bool* ok) {
         McpsHwInfo info;
         if (ParseHwInfo(reply, &info)) radios.push_back(info);
       },
-      MCPS802154_CMD_NEW_HW);
+      MCPS802154_CMD_NEW_HW, LOG_TAG);
   return radios;
 }
 
 McpsHwInfo McpsUtils::GetHardwareInfo(uint32_t hw_index, bool* ok) {
   LOG(INFO) << __func__;
   McpsHwInfo info;
-  UniqueNlMsg msg;
+  UniqueNlMsg msg(LOG_TAG);
   if (!SetMcpsCommand(msg.get(), hw_index, MCPS802154_CMD_GET_HW, 0)) {
     *ok = false;
     return info;
   }
   // A partial reply still counts: callers go by the exchange's result.
   *ok = socket_factory_->SendAndAwaitResponse(
-      msg.get(), [&info](nl_msg* reply) { ParseHwInfo(reply, &info); }, MCPS802154_CMD_NEW_HW);
+      msg.get(), [&info](nl_msg* reply) { ParseHwInfo(reply, &info); }, MCPS802154_CMD_NEW_HW,
+      LOG_TAG);
   return info;
 }
 
@@ -141,7 +142,7 @@ std::string McpsUtils::SchedulerName(McpsScheduler scheduler) {
 bool McpsUtils::SetScheduler(uint32_t hw_index, McpsScheduler scheduler,
                              SlotDuration slot_duration, NodeType node_type, bool params_only) {
   LOG(INFO) << __func__;
-  UniqueNlMsg msg;
+  UniqueNlMsg msg(LOG_TAG);
   uint8_t cmd = params_only ? MCPS802154_CMD_SET_SCHEDULER_PARAMS : MCPS802154_CMD_SET_SCHEDULER;
   if (!SetMcpsCommand(msg.get(), hw_index, cmd, 0)) return false;
 
@@ -169,12 +170,12 @@ bool McpsUtils::SetScheduler(uint32_t hw_index, McpsScheduler scheduler,
     LOG(ERROR) << __func__ << " Error creating MCPS message";
     return false;
   }
-  return socket_factory_->SendAndAwaitAck(msg.get());
+  return socket_factory_->SendAndAwaitAck(msg.get(), LOG_TAG);
 }
 
 bool McpsUtils::SetFiraRegion(uint32_t hw_index) {
   LOG(INFO) << __func__;
-  UniqueNlMsg msg;
+  UniqueNlMsg msg(LOG_TAG);
   if (!SetMcpsCommand(msg.get(), hw_index, MCPS802154_CMD_SET_SCHEDULER, 0)) return false;
 
   auto put_attributes = [&]() {
@@ -192,7 +193,7 @@ bool McpsUtils::SetFiraRegion(uint32_t hw_index) {
     LOG(ERROR) << __func__ << ": Error creating MCPS message";
     return false;
   }
-  return socket_factory_->SendAndAwaitAck(msg.get());
+  return socket_factory_->SendAndAwaitAck(msg.get(), LOG_TAG);
 }
 
 int McpsUtils::CalibrationPayloadBudget() { return getpagesize() - NLMSG_HDRLEN; }
@@ -216,7 +217,7 @@ bool McpsUtils::SetCalibration(uint32_t hw_index, ConfigUtils* config) {
   int status = 0;
 
   while (key != end && status == 0) {
-    UniqueNlMsg msg;
+    UniqueNlMsg msg(LOG_TAG);
     if (!SetMcpsCommand(msg.get(), hw_index, MCPS802154_CMD_SET_CALIBRATIONS, 0)) return false;
     nlattr* calibrations =
         nla_nest_start(msg.get(), MCPS802154_ATTR_CALIBRATIONS | NLA_F_NESTED);

@@ -39,7 +39,7 @@ using OwnedNlMsg = std::unique_ptr<nl_msg, NlMsgDeleter>;
 
 std::array<nla_policy, CTRL_ATTR_MAX + 1> MakeControllerPolicy() {
   std::array<nla_policy, CTRL_ATTR_MAX + 1> policy{};
-  policy[CTRL_ATTR_FAMILY_ID].type = NLA_U16;
+  policy[CTRL_ATTR_FAMILY_ID] = {NLA_U16, sizeof(uint16_t), sizeof(uint16_t)};
   policy[CTRL_ATTR_FAMILY_NAME].type = NLA_STRING;
   return policy;
 }

@@ -144,9 +144,19 @@ constexpr nla_policy Policy(uint16_t type, uint16_t maxlen = 0) {
   return policy;
 }
 
+// An integer read with nla_get_*: exactly |width| bytes. libnl checks no
+// minimum for its signed types, so every integer entry states its width.
+constexpr nla_policy Integer(uint16_t type, uint16_t width) {
+  nla_policy policy{};
+  policy.type = type;
+  policy.minlen = width;
+  policy.maxlen = width;
+  return policy;
+}
+
 constexpr McpsPolicy<MCPS802154_ATTR_MAX> NewHwPolicy() {
   McpsPolicy<MCPS802154_ATTR_MAX> policy{};
-  policy[MCPS802154_ATTR_HW] = Policy(NLA_U32);
+  policy[MCPS802154_ATTR_HW] = Integer(NLA_U32, sizeof(uint32_t));
   policy[MCPS802154_ATTR_WPAN_PHY_NAME] = Policy(NLA_STRING, kMcpsNameMaxLen);
   policy[MCPS802154_ATTR_SCHEDULER_NAME] = Policy(NLA_STRING, kMcpsNameMaxLen);
   return policy;
@@ -155,28 +165,28 @@ constexpr McpsPolicy<MCPS802154_ATTR_MAX> NewHwPolicy() {
 constexpr McpsPolicy<MCPS802154_CALIBRATION_ATTR_MAX> CalibrationPolicy() {
   McpsPolicy<MCPS802154_CALIBRATION_ATTR_MAX> policy{};
   policy[MCPS802154_CALIBRATION_ATTR_KEY] = Policy(NLA_STRING, kMcpsCalibrationKeyMaxLen);
-  policy[MCPS802154_CALIBRATION_ATTR_STATUS] = Policy(NLA_S32);
+  policy[MCPS802154_CALIBRATION_ATTR_STATUS] = Integer(NLA_S32, sizeof(int32_t));
   return policy;
 }
 
 constexpr McpsPolicy<MCPS802154_ATTR_MAX> RangingReportPolicy() {
   McpsPolicy<MCPS802154_ATTR_MAX> policy{};
-  policy[MCPS802154_ATTR_HW] = Policy(NLA_U32);
+  policy[MCPS802154_ATTR_HW] = Integer(NLA_U32, sizeof(uint32_t));
   policy[MCPS802154_ATTR_RANGING_RESULT] = Policy(NLA_NESTED);
   return policy;
 }
 
 constexpr McpsPolicy<MCPS802154_RANGING_RESULT_ATTR_MAX> RangingResultPolicy() {
   McpsPolicy<MCPS802154_RANGING_RESULT_ATTR_MAX> policy{};
-  policy[MCPS802154_RANGING_RESULT_ATTR_REQUEST_ID] = Policy(NLA_U32);
-  policy[MCPS802154_RANGING_RESULT_ATTR_MEASUREMENT] = Policy(NLA_U32);
+  policy[MCPS802154_RANGING_RESULT_ATTR_REQUEST_ID] = Integer(NLA_U32, sizeof(uint32_t));
+  policy[MCPS802154_RANGING_RESULT_ATTR_MEASUREMENT] = Integer(NLA_U32, sizeof(uint32_t));
   return policy;
 }
 
 // What the driver accepts in requests.
 constexpr McpsPolicy<MCPS802154_ATTR_MAX> RequestPolicy() {
   McpsPolicy<MCPS802154_ATTR_MAX> policy{};
-  policy[MCPS802154_ATTR_HW] = Policy(NLA_U32);
+  policy[MCPS802154_ATTR_HW] = Integer(NLA_U32, sizeof(uint32_t));
   policy[MCPS802154_ATTR_SCHEDULER_NAME] = Policy(NLA_STRING, kMcpsNameMaxLen);
   policy[MCPS802154_ATTR_SCHEDULER_PARAMS] = Policy(NLA_NESTED);
   policy[MCPS802154_ATTR_SCHEDULER_REGIONS] = Policy(NLA_NESTED);
@@ -189,8 +199,8 @@ constexpr McpsPolicy<MCPS802154_ATTR_MAX> RequestPolicy() {
 
 constexpr McpsPolicy<MCPS802154_SCHEDULER_PARAMS_ATTR_MAX> SchedulerParamsPolicy() {
   McpsPolicy<MCPS802154_SCHEDULER_PARAMS_ATTR_MAX> policy{};
-  policy[MCPS802154_SCHEDULER_PARAMS_ATTR_SLOT_DURATION] = Policy(NLA_U32, sizeof(uint32_t));
-  policy[MCPS802154_SCHEDULER_PARAMS_ATTR_NODE_TYPE] = Policy(NLA_U32, sizeof(uint32_t));
+  policy[MCPS802154_SCHEDULER_PARAMS_ATTR_SLOT_DURATION] = Integer(NLA_U32, sizeof(uint32_t));
+  policy[MCPS802154_SCHEDULER_PARAMS_ATTR_NODE_TYPE] = Integer(NLA_U32, sizeof(uint32_t));
   return policy;
 }
 
@@ -203,7 +213,7 @@ constexpr McpsPolicy<MCPS802154_REGION_ATTR_MAX> RegionPolicy() {
 constexpr McpsPolicy<MCPS802154_CALIBRATION_ATTR_MAX> CalibrationRequestPolicy() {
   McpsPolicy<MCPS802154_CALIBRATION_ATTR_MAX> policy{};
   policy[MCPS802154_CALIBRATION_ATTR_KEY] = Policy(NLA_STRING);
-  policy[MCPS802154_CALIBRATION_ATTR_VALUE] = Policy(NLA_U32, sizeof(uint32_t));
+  policy[MCPS802154_CALIBRATION_ATTR_VALUE] = Integer(NLA_U32, sizeof(uint32_t));
   return policy;
 }
 

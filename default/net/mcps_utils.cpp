@@ -27,12 +27,15 @@ int CalibrationElementOverhead() { return nla_total_size(0) + nla_total_size(siz
 // Parses a calibration value as decimal, then as hexadecimal (with or without
 // 0x). Anything else, even with a valid prefix, is refused; so is an empty
 // value, which would otherwise reach the radio as 0.
-bool ParseCalibrationValue(const char* text, uint32_t* value) {
-  if (*text == '\0') return false;
+// A NUL inside the text ends the conversion short of the text's end, so
+// such a value is refused too.
+bool ParseCalibrationValue(const std::string& text, uint32_t* value) {
+  if (text.empty()) return false;
+  const char* text_end = text.c_str() + text.size();
   char* end = nullptr;
-  long parsed = strtol(text, &end, 10);
-  if (*end != '\0') parsed = strtol(text, &end, 16);
-  if (*end != '\0') return false;
+  long parsed = strtol(text.c_str(), &end, 10);
+  if (end != text_end) parsed = strtol(text.c_str(), &end, 16);
+  if (end != text_end) return false;
   *value = static_cast<uint32_t>(parsed);
   return true;
 }
@@ -231,24 +234,28 @@ bool McpsUtils::SetCalibration(uint32_t hw_index, ConfigUtils* config) {
     int added = 0;
 
     for (; key != end; ++key) {
-      const char* name = key->first.c_str();
-      const int key_size = nla_total_size(static_cast<int>(strlen(name)) + 1);
+      // The key and value go out as the store holds them, a NUL inside the
+      // key included: looked up or sent by its C string, such a key would
+      // stand for a shorter one.
+      const std::string& name = key->first;
+      const int key_length = static_cast<int>(name.size()) + 1;
+      const int key_size = nla_total_size(key_length);
       if (key_size > key_room) {
         LOG(ERROR) << "Skip incorrect key " << name;
         skipped = true;
         continue;
       }
       if (length + overhead + key_size > budget) break;  // starts the next message
-      const char* text = config->GetValue(name);
       uint32_t value = 0;
-      if (text == nullptr || !ParseCalibrationValue(text, &value)) {
+      if (!ParseCalibrationValue(key->second, &value)) {
         LOG(WARNING) << "Skip incorrect key " << name;
         skipped = true;
         continue;
       }
       nlattr* element = nla_nest_start(msg.get(), MCPS802154_CALIBRATIONS_ATTR_CALIBRATION |
                                                       NLA_F_NESTED);
-      if (element == nullptr || nla_put_string(msg.get(), MCPS802154_CALIBRATION_ATTR_KEY, name) ||
+      if (element == nullptr ||
+          nla_put(msg.get(), MCPS802154_CALIBRATION_ATTR_KEY, key_length, name.c_str()) ||
           nla_put_u32(msg.get(), MCPS802154_CALIBRATION_ATTR_VALUE, value) ||
           nla_nest_end(msg.get(), element)) {
         LOG(ERROR) << "PutCalibrationKeys: Error creating MCPS message";

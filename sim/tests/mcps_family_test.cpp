@@ -128,6 +128,27 @@ TEST_F(McpsFamilyTest, DiscoveryKeepsOnlyRadiosWithAUsablePhyName) {
   EXPECT_EQ(std::tie(info.hw_index, info.scheduler), std::make_tuple(0u, std::string()));
 }
 
+TEST_F(McpsFamilyTest, DumpsAreReadWholeHoweverPacked) {
+  // Packed, a few hundred radios fill several datagrams, NLMSG_DONE sharing
+  // the last. Unpacked, as many would overflow the client's receive buffer:
+  // the kernel writes a dump only as fast as it is read, the simulator at once.
+  const struct {
+    size_t datagram_bytes;
+    uint32_t radios;
+  } kCases[] = {{DriverSimulator::kDefaultDumpDatagramBytes, 300}, {0, 40}, {100, 40}};
+  for (const auto& c : kCases) {
+    SCOPED_TRACE(c.datagram_bytes);
+    for (uint32_t i = 0; i < c.radios; ++i) radios_.AddRadio(i, i + 1);
+    simulator_.SetDumpDatagramBytes(c.datagram_bytes);
+    bool ok = false;
+    std::vector<McpsHwInfo> found = mcps_.ListHardware(&ok);
+    EXPECT_TRUE(ok);
+    ASSERT_EQ(found.size(), c.radios);
+    for (uint32_t i = 0; i < c.radios; ++i) EXPECT_EQ(found[i].phy_index, i + 1);
+    for (uint32_t i = 0; i < c.radios; ++i) radios_.RemoveRadio(i);
+  }
+}
+
 TEST_F(McpsFamilyTest, SchedulerChangesAreCheckedAndKept) {
   radios_.AddRadio(0, 0u);
   const int kFira = 100;  // SetFiraRegion instead of SetScheduler

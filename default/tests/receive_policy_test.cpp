@@ -13,24 +13,18 @@ namespace hardware {
 namespace dalix {
 namespace {
 
+// clang-format off
 // Bytes that nla_get_* reads for an integer type; 0 for anything else.
 int Width(uint16_t type) {
   switch (type) {
-    case NLA_U8:
-    case NLA_S8:
-      return 1;
-    case NLA_U16:
-    case NLA_S16:
-      return 2;
-    case NLA_U32:
-    case NLA_S32:
-      return 4;
-    case NLA_U64:
-    case NLA_S64:
-      return 8;
+    case NLA_U8: case NLA_S8: return 1;
+    case NLA_U16: case NLA_S16: return 2;
+    case NLA_U32: case NLA_S32: return 4;
+    case NLA_U64: case NLA_S64: return 8;
   }
   return 0;
 }
+// clang-format on
 
 struct PolicyCase {
   const char* name;

@@ -230,21 +230,6 @@ TEST_F(DriverSimulatorTest, RefusalsEchoTheHeaderAndEndTheAnswer) {
   }
 }
 
-TEST_F(DriverSimulatorTest, MalformedFaultCutsTheGenericHeaderOnce) {
-  Fault fault{Fault::Kind::kMalformed};
-  fault.count = 1;
-  simulator_.SetCommandFault(kTestFamilyName, kTestCmdGet, fault);
-  UniqueNlMsg request = NewRequest(family_id_, kTestCmdGet, NLM_F_ACK, 54);
-  Send(request.get());
-
-  std::vector<uint8_t> reply = Receive();
-  ASSERT_GE(reply.size(), NLMSG_HDRLEN + 1u);
-  EXPECT_EQ(NLMSG_HDRLEN + 1u, Header(reply)->nlmsg_len);
-  EXPECT_EQ(kTestCmdGet, static_cast<const genlmsghdr*>(NLMSG_DATA(Header(reply)))->cmd);
-  Expect(Receive(), {NLMSG_ERROR, 54});
-  ExpectNothingMore();
-}
-
 TEST_F(DriverSimulatorTest, StoppedSimulatorRefusesConnectionsAndRestarts) {
   simulator_.Stop();
   EXPECT_FALSE(simulator_.IsRunning());
@@ -282,16 +267,6 @@ TEST_F(DriverSimulatorTest, PostedTasksRunInDueOrder) {
   simulator_.Post([=] { send_value(1); });
   simulator_.Post([=] { send_value(2); });
   for (uint32_t value = 1; value <= 3; ++value) Expect(Receive(), {kFamily, 0, value});
-}
-
-TEST_F(DriverSimulatorTest, RegistrationKeepsIdsStable) {
-  TestFamily other(&simulator_);
-  int other_id = simulator_.RegisterFamily("other", &other);
-  EXPECT_NE(family_id_, other_id);
-  EXPECT_EQ(other_id, simulator_.FamilyId("other"));
-  EXPECT_EQ(family_id_, simulator_.RegisterFamily(kTestFamilyName, &family_));
-  EXPECT_EQ(-1, simulator_.FamilyId("absent"));
-  simulator_.Stop();
 }
 
 }  // namespace

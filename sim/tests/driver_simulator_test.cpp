@@ -230,16 +230,6 @@ TEST_F(DriverSimulatorTest, RefusalsEchoTheHeaderAndEndTheAnswer) {
   }
 }
 
-TEST_F(DriverSimulatorTest, StoppedSimulatorRefusesConnectionsAndRestarts) {
-  simulator_.Stop();
-  EXPECT_FALSE(simulator_.IsRunning());
-  UniqueNlMsg request = NewRequest(family_id_, kTestCmdGet, NLM_F_ACK, 81);
-  EXPECT_EQ(-1, Send(request.get()));
-  EXPECT_EQ(ECONNREFUSED, errno);
-  ASSERT_TRUE(simulator_.Start());
-  ExpectNothingMore();
-}
-
 // A client that closed after its answer is gone without a word, as in the
 // kernel; a full receive buffer is worth a warning.
 TEST_F(DriverSimulatorTest, DropsSilentlyOnlyToAPortThatIsGone) {

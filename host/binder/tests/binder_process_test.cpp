@@ -191,3 +191,16 @@ TEST_F(BinderProcessTest, BinderKeepsItsObjectAndALivingObjectKeepsItsBinder) {
 }
 
 }  // namespace
+
+namespace {
+
+// make() is the only owner the device tolerates; anything else aborts here
+// at the first ref() or at destruction instead of being owned twice there.
+TEST(SharedRefBaseDeathTest, ObjectsNotMadeByMakeAbort) {
+  GTEST_FLAG_SET(death_test_style, "threadsafe");
+  EXPECT_DEATH(std::make_shared<Thing>(), "not created by SharedRefBase::make\\(\\) was destroyed");
+  EXPECT_DEATH({ Thing on_stack; }, "was destroyed");
+  EXPECT_DEATH((void)std::make_shared<Thing>()->asBinder(), "was asked for ref\\(\\)");
+}
+
+}  // namespace

@@ -79,7 +79,7 @@ void BM_OneShotSendAndAwaitAck(benchmark::State& state) {
   for (auto _ : state) {
     UniqueNlMsg set = sim::TestFamily::NewRequest(session.family_id(), sim::kTestCmdSet);
     nla_put_u32(set.get(), sim::kTestAttrValue, ++value);
-    if (!session.factory().SendAndAwaitAck(set.get())) state.SkipWithError("exchange failed");
+    if (!session.factory().SendAndAwaitAck(set.get(), "dalix.bench")) state.SkipWithError("exchange failed");
   }
 }
 BENCHMARK(BM_OneShotSendAndAwaitAck);

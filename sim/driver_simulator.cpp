@@ -39,7 +39,7 @@ using OwnedNlMsg = std::unique_ptr<nl_msg, NlMsgDeleter>;
 
 std::array<nla_policy, CTRL_ATTR_MAX + 1> MakeControllerPolicy() {
   std::array<nla_policy, CTRL_ATTR_MAX + 1> policy{};
-  policy[CTRL_ATTR_FAMILY_ID].type = NLA_U16;
+  policy[CTRL_ATTR_FAMILY_ID] = {NLA_U16, sizeof(uint16_t), sizeof(uint16_t)};
   policy[CTRL_ATTR_FAMILY_NAME].type = NLA_STRING;
   return policy;
 }
@@ -51,12 +51,48 @@ const nla_policy* ControllerPolicy() {
 
 }  // namespace
 
+class DriverSimulator::DumpBatch {
+ public:
+  // |limit| 0: every message is a datagram of its own.
+  DumpBatch(DriverSimulator* simulator, uint32_t port, size_t limit)
+      : simulator_(simulator), port_(port), limit_(limit) {}
+  ~DumpBatch() { Flush(); }
+
+  // False when a datagram this message completed could not be delivered.
+  bool Add(const nlmsghdr* message) {
+    const size_t size = NLMSG_ALIGN(message->nlmsg_len);
+    bool delivered = true;
+    if (!pending_.empty() && pending_.size() + size > limit_) delivered = Flush();
+    const auto* bytes = reinterpret_cast<const uint8_t*>(message);
+    pending_.insert(pending_.end(), bytes, bytes + message->nlmsg_len);
+    pending_.resize(pending_.size() + size - message->nlmsg_len, 0);
+    if (limit_ == 0) delivered = Flush() && delivered;
+    return delivered;
+  }
+
+  uint32_t port() const { return port_; }
+
+  bool Flush() {
+    if (pending_.empty()) return true;
+    bool sent = simulator_->SendRaw(port_, pending_.data(), pending_.size());
+    pending_.clear();
+    return sent;
+  }
+
+ private:
+  DriverSimulator* const simulator_;
+  const uint32_t port_;
+  const size_t limit_;
+  std::vector<uint8_t> pending_;
+};
+
 DriverSimulator::DriverSimulator(uint32_t port)
     : port_(port),
       running_(false),
       next_family_id_(kFirstFamilyId),
       next_task_order_(0),
-      request_count_(0) {}
+      request_count_(0),
+      dump_datagram_bytes_(kDefaultDumpDatagramBytes) {}
 
 DriverSimulator::~DriverSimulator() { Stop(); }
 
@@ -115,17 +151,24 @@ bool DriverSimulator::IsRunning() const {
   return running_;
 }
 
-int DriverSimulator::RegisterFamily(const std::string& name, FamilyHandler* family) {
+int DriverSimulator::RegisterFamily(const std::string& name, FamilyHandler* family,
+                                    uint8_t version) {
   std::lock_guard<std::mutex> lock(mutex_);
   auto found = families_.find(name);
   if (found != families_.end()) {
     found->second.handler = family;
+    found->second.version = version;
     found->second.present = true;
     return found->second.id;
   }
   int id = next_family_id_++;
-  families_[name] = Family{id, family, true, std::nullopt, {}};
+  families_[name] = Family{id, version, family, true, std::nullopt, {}};
   return id;
+}
+
+void DriverSimulator::SetDumpDatagramBytes(size_t bytes) {
+  std::lock_guard<std::mutex> lock(mutex_);
+  dump_datagram_bytes_ = bytes;
 }
 
 void DriverSimulator::SetFamilyPresent(const std::string& name, bool present) {
@@ -324,14 +367,15 @@ void DriverSimulator::HandleMessage(uint32_t sender, const nlmsghdr* header) {
   }
 
   FamilyHandler* handler = nullptr;
+  uint8_t version = 0;
   Fault fault;
-  if (!TakeFamily(header->nlmsg_type, request.cmd, &handler, &fault)) {
+  if (!TakeFamily(header->nlmsg_type, request.cmd, &handler, &version, &fault)) {
     SendError(sender, header, -ENOENT);
     return;
   }
-  Responder responder(request, [this, sender](const nlmsghdr* reply) {
-    return SendMessage(sender, reply);
-  });
+  DumpBatch batch(this, sender, request.IsDump() ? DumpDatagramBytes() : 0);
+  Responder responder(request, version,
+                      [&batch](const nlmsghdr* reply) { return batch.Add(reply); });
   switch (fault.kind) {
     case Fault::Kind::kNoAnswer:
       return;
@@ -356,9 +400,10 @@ void DriverSimulator::HandleMessage(uint32_t sender, const nlmsghdr* header) {
   }
 
   if (responder.Refused()) {
+    batch.Flush();
     SendError(sender, header, responder.error());
   } else if (request.IsDump()) {
-    SendDone(sender, header);
+    SendDone(batch, header);
   } else if (header->nlmsg_flags & NLM_F_ACK) {
     SendError(sender, header, 0);
   }
@@ -376,7 +421,8 @@ void DriverSimulator::HandleController(const Request& request, const nlmsghdr* h
     return;
   }
 
-  std::vector<std::pair<std::string, int>> matches;
+  // Name, then id and version.
+  std::vector<std::pair<std::string, std::pair<int, uint8_t>>> matches;
   {
     std::lock_guard<std::mutex> lock(mutex_);
     for (const auto& entry : families_) {
@@ -385,7 +431,7 @@ void DriverSimulator::HandleController(const Request& request, const nlmsghdr* h
           (attrs[CTRL_ATTR_FAMILY_NAME] && entry.first == nla_get_string(attrs[CTRL_ATTR_FAMILY_NAME])) ||
           (attrs[CTRL_ATTR_FAMILY_ID] &&
            entry.second.id == nla_get_u16(attrs[CTRL_ATTR_FAMILY_ID]))) {
-        matches.emplace_back(entry.first, entry.second.id);
+        matches.emplace_back(entry.first, std::make_pair(entry.second.id, entry.second.version));
       }
     }
   }
@@ -398,33 +444,33 @@ void DriverSimulator::HandleController(const Request& request, const nlmsghdr* h
     return;
   }
 
-  Responder responder(request, [this, &request](const nlmsghdr* reply) {
-    return SendMessage(request.port, reply);
-  });
+  DumpBatch batch(this, request.port, request.IsDump() ? DumpDatagramBytes() : 0);
+  Responder responder(request, kControllerVersion,
+                      [&batch](const nlmsghdr* reply) { return batch.Add(reply); });
   for (const auto& match : matches) {
     UniqueNlMsg reply = responder.NewReply(CTRL_CMD_NEWFAMILY);
-    genlmsghdr* genl = genlmsg_hdr(nlmsg_hdr(reply.get()));
-    genl->version = kControllerVersion;
-    nla_put_u16(reply.get(), CTRL_ATTR_FAMILY_ID, static_cast<uint16_t>(match.second));
+    nla_put_u16(reply.get(), CTRL_ATTR_FAMILY_ID, static_cast<uint16_t>(match.second.first));
     nla_put_string(reply.get(), CTRL_ATTR_FAMILY_NAME, match.first.c_str());
-    nla_put_u32(reply.get(), CTRL_ATTR_VERSION, 1);
+    nla_put_u32(reply.get(), CTRL_ATTR_VERSION, match.second.second);
     nla_put_u32(reply.get(), CTRL_ATTR_HDRSIZE, 0);
     responder.Reply(reply.get());
   }
   if (request.IsDump()) {
-    SendDone(request.port, header);
+    SendDone(batch, header);
   } else if (header->nlmsg_flags & NLM_F_ACK) {
     SendError(request.port, header, 0);
   }
 }
 
-bool DriverSimulator::TakeFamily(int type, uint8_t cmd, FamilyHandler** handler, Fault* fault) {
+bool DriverSimulator::TakeFamily(int type, uint8_t cmd, FamilyHandler** handler,
+                                 uint8_t* version, Fault* fault) {
   std::lock_guard<std::mutex> lock(mutex_);
   for (auto& entry : families_) {
     Family& family = entry.second;
     if (family.id != type) continue;
     if (!family.present || family.handler == nullptr) return false;
     *handler = family.handler;
+    *version = family.version;
     Fault* applied = nullptr;
     auto command_fault = family.command_faults.find(cmd);
     if (command_fault != family.command_faults.end()) {
@@ -458,6 +504,8 @@ void DriverSimulator::SendError(uint32_t port, const nlmsghdr* request, int erro
   } message = {};
   message.header.nlmsg_len = sizeof(message);
   message.header.nlmsg_type = NLMSG_ERROR;
+  // Only the request's header comes back, never its payload.
+  message.header.nlmsg_flags = NLM_F_CAPPED;
   message.header.nlmsg_seq = request->nlmsg_seq;
   message.header.nlmsg_pid = port;
   message.error.error = error;
@@ -465,7 +513,7 @@ void DriverSimulator::SendError(uint32_t port, const nlmsghdr* request, int erro
   SendRaw(port, &message, sizeof(message));
 }
 
-void DriverSimulator::SendDone(uint32_t port, const nlmsghdr* request) {
+void DriverSimulator::SendDone(DumpBatch& batch, const nlmsghdr* request) {
   struct {
     nlmsghdr header;
     int32_t status;
@@ -474,8 +522,14 @@ void DriverSimulator::SendDone(uint32_t port, const nlmsghdr* request) {
   message.header.nlmsg_type = NLMSG_DONE;
   message.header.nlmsg_flags = NLM_F_MULTI;
   message.header.nlmsg_seq = request->nlmsg_seq;
-  message.header.nlmsg_pid = port;
-  SendRaw(port, &message, sizeof(message));
+  message.header.nlmsg_pid = batch.port();
+  batch.Add(&message.header);
+  batch.Flush();
+}
+
+size_t DriverSimulator::DumpDatagramBytes() const {
+  std::lock_guard<std::mutex> lock(mutex_);
+  return dump_datagram_bytes_;
 }
 
 void DriverSimulator::SendMalformedReply(Responder& responder, uint8_t cmd) {

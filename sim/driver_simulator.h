@@ -52,9 +52,17 @@ class DriverSimulator {
   bool IsRunning() const;
   uint32_t port() const { return port_; }
 
+  // The kernel packs a dump's messages into datagrams of about a page
+  // (NLMSG_DONE included when it fits); so does the simulator by default.
+  static constexpr size_t kDefaultDumpDatagramBytes = 4096;
+
   // Makes |family| resolvable as |name| and returns the id requests carry.
-  // Registering a name again replaces its handler and keeps its id.
-  int RegisterFamily(const std::string& name, FamilyHandler* family);
+  // Every reply carries |version| in its generic header, as the kernel puts
+  // the family's own version there. Registering a name again replaces its
+  // handler and version and keeps its id.
+  int RegisterFamily(const std::string& name, FamilyHandler* family, uint8_t version = 1);
+  // Largest datagram a dump is packed into; 0 sends one message per datagram.
+  void SetDumpDatagramBytes(size_t bytes);
   // A family that is not present no longer resolves (-ENOENT) and its
   // requests are refused with ENOENT, as when the driver goes away.
   void SetFamilyPresent(const std::string& name, bool present);
@@ -92,6 +100,7 @@ class DriverSimulator {
  private:
   struct Family {
     int id;
+    uint8_t version;
     FamilyHandler* handler;
     bool present;
     std::optional<Fault> fault;
@@ -111,10 +120,14 @@ class DriverSimulator {
   void HandleController(const Request& request, const nlmsghdr* header);
   // Looks up the family of |type| and takes one use of the fault that
   // applies to |cmd|. False if no present family has that id.
-  bool TakeFamily(int type, uint8_t cmd, FamilyHandler** handler, Fault* fault);
+  bool TakeFamily(int type, uint8_t cmd, FamilyHandler** handler, uint8_t* version,
+                  Fault* fault);
+  // Packs the messages of one dump answer into datagrams.
+  class DumpBatch;
   bool SendMessage(uint32_t port, const nlmsghdr* header);
   void SendError(uint32_t port, const nlmsghdr* request, int error);
-  void SendDone(uint32_t port, const nlmsghdr* request);
+  void SendDone(DumpBatch& batch, const nlmsghdr* request);
+  size_t DumpDatagramBytes() const;
   static void SendMalformedReply(Responder& responder, uint8_t cmd);
 
   const uint32_t port_;
@@ -129,6 +142,7 @@ class DriverSimulator {
   std::vector<Task> tasks_;
   uint64_t next_task_order_;
   int request_count_;
+  size_t dump_datagram_bytes_;
   SendObserver send_observer_;
 };
 

@@ -40,7 +40,9 @@ struct Request {
 //   - responder.Reply(...):  one or more replies, each its own datagram, then
 //                            the acknowledgement if asked for. For a dump
 //                            (request.IsDump()) every reply is flagged
-//                            NLM_F_MULTI and NLMSG_DONE follows, never an ack.
+//                            NLM_F_MULTI, replies are packed into datagrams
+//                            as the kernel packs them, and NLMSG_DONE
+//                            follows, never an ack.
 //   - responder.Refuse(e):   an NLMSG_ERROR carrying -e and the echoed
 //                            request header; no acknowledgement after it.
 // Replies are built with responder.NewReply(cmd), which puts the generic

@@ -8,14 +8,15 @@ namespace hardware {
 namespace dalix {
 namespace sim {
 
-Responder::Responder(const Request& request, std::function<bool(const nlmsghdr*)> send)
-    : request_(request), send_(std::move(send)), error_(0), replies_sent_(0) {}
+Responder::Responder(const Request& request, uint8_t version,
+                     std::function<bool(const nlmsghdr*)> send)
+    : request_(request), version_(version), send_(std::move(send)), error_(0), replies_sent_(0) {}
 
 UniqueNlMsg Responder::NewReply(uint8_t cmd) const {
   UniqueNlMsg reply;
   int flags = request_.IsDump() ? NLM_F_MULTI : 0;
   genlmsg_put(reply.get(), request_.port, request_.seq, request_.family_id, 0, flags, cmd,
-              request_.version);
+              version_);
   return reply;
 }
 

@@ -18,13 +18,15 @@ namespace sim {
 // Refused()/error() once the family has returned.
 class Responder {
  public:
-  // |send| puts one finished netlink message on the wire to the request's port.
-  Responder(const Request& request, std::function<bool(const nlmsghdr*)> send);
+  // |send| puts one finished netlink message on the wire to the request's
+  // port; replies carry the family's |version|.
+  Responder(const Request& request, uint8_t version,
+            std::function<bool(const nlmsghdr*)> send);
   Responder(const Responder&) = delete;
   Responder& operator=(const Responder&) = delete;
 
-  // A reply to the request: the request's family, sequence and port, flagged
-  // NLM_F_MULTI when the request is a dump.
+  // A reply to the request: the request's family, sequence and port, the
+  // family's version, flagged NLM_F_MULTI when the request is a dump.
   UniqueNlMsg NewReply(uint8_t cmd) const;
   // Sends |reply| now. False when the client's socket could not take it
   // (closed, or full: sends never block). Ignored after Refuse().
@@ -40,6 +42,7 @@ class Responder {
 
  private:
   const Request& request_;
+  const uint8_t version_;
   std::function<bool(const nlmsghdr*)> send_;
   int error_;
   int replies_sent_;

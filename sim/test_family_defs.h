@@ -37,8 +37,8 @@ enum TestAttribute : int {
 
 inline const nla_policy kTestPolicy[kTestAttrMax + 1] = {
     {},
-    {NLA_U32, 0, 0},
-    {NLA_U32, 0, 0},
+    {NLA_U32, sizeof(uint32_t), sizeof(uint32_t)},
+    {NLA_U32, sizeof(uint32_t), sizeof(uint32_t)},
 };
 
 constexpr uint8_t kTestFamilyVersion = 1;

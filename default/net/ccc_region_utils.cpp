@@ -35,7 +35,7 @@ bool CccRegionUtils::StartRegionMessage(nl_msg* msg, uint32_t hw_index, uint8_t 
 bool CccRegionUtils::StartCccSession(uint32_t hw_index, uint32_t /*first*/, uint64_t /*timeref*/,
                                      uint8_t channel, uint32_t* u32_param) {
   LOG(INFO) << __func__;
-  UniqueNlMsg msg;
+  UniqueNlMsg msg(LOG_TAG);
   nlattr* testdata = nullptr;
   if (!StartRegionMessage(msg.get(), hw_index, KX7200_TM_CMD_CCC_START_SESSION, &testdata)) {
     return false;
@@ -50,7 +50,7 @@ bool CccRegionUtils::StartCccSession(uint32_t hw_index, uint32_t /*first*/, uint
   bool accepted = false;
   bool replied = factory_->SendAndAwaitResponse(
       msg.get(), [&accepted](nl_msg* reply) { accepted = ParseTestModeCmdResponse(reply); },
-      MCPS802154_CMD_TESTMODE);
+      MCPS802154_CMD_TESTMODE, LOG_TAG);
   return replied;
 }
 

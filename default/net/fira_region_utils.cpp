@@ -223,9 +223,9 @@ nlattr* FiraRegionUtils::GetCallContent(nl_msg* msg, uint32_t* hw_index, uint8_t
 // ---- Session state --------------------------------------------------------
 
 bool FiraRegionUtils::SendSessionState(uint32_t hw_index, uint8_t call, uint32_t session_id) {
-  UniqueNlMsg msg;
+  UniqueNlMsg msg(LOG_TAG);
   if (!CreateSessionStateMsg(msg.get(), hw_index, call, session_id)) return false;
-  return socket_factory_->SendAndAwaitAck(msg.get());
+  return socket_factory_->SendAndAwaitAck(msg.get(), LOG_TAG);
 }
 
 bool FiraRegionUtils::InitSession(uint32_t hw_index, uint32_t session_id) {
@@ -250,7 +250,7 @@ bool FiraRegionUtils::StartSession(uint32_t hw_index, uint32_t session_id) {
     LOG(ERROR) << __func__ << ": Fira callback needs to be set for this hw_index.";
     return false;
   }
-  UniqueNlMsg msg;
+  UniqueNlMsg msg(LOG_TAG);
   if (!CreateSessionStateMsg(msg.get(), hw_index, FIRA_CALL_SESSION_START, session_id)) {
     return false;
   }
@@ -306,7 +306,7 @@ bool FiraRegionUtils::SetProperties(uint32_t hw_index, ConfigUtils& config) {
 
 bool FiraRegionUtils::ConfigTwrSession(uint32_t hw_index, const FiraTwrSession& session) {
   LOG(INFO) << __func__;
-  UniqueNlMsg msg;
+  UniqueNlMsg msg(LOG_TAG);
   const HwConfig hw_config = HwConfigOrDefault(hw_index);
   nlattr* region_nest = nullptr;
   nlattr* params_nest = nullptr;
@@ -331,7 +331,7 @@ bool FiraRegionUtils::ConfigTwrSession(uint32_t hw_index, const FiraTwrSession& 
     return false;
   }
   if (!EndCallMessage(msg.get(), region_nest, params_nest)) return false;
-  return socket_factory_->SendAndAwaitAck(msg.get());
+  return socket_factory_->SendAndAwaitAck(msg.get(), LOG_TAG);
 }
 
 bool FiraRegionUtils::PutMainSessionParams(nl_msg* msg, const FiraTwrSession& session) {
@@ -610,7 +610,7 @@ bool FiraRegionUtils::SendControlees(const char* caller, uint32_t hw_index, uint
     LOG(ERROR) << caller << ": Empty controlees";
     return false;
   }
-  UniqueNlMsg msg;
+  UniqueNlMsg msg(LOG_TAG);
   nlattr* region_nest = nullptr;
   nlattr* params_nest = nullptr;
   if (!StartCallMessage(msg.get(), hw_index, call, &region_nest, &params_nest)) return false;
@@ -622,7 +622,7 @@ bool FiraRegionUtils::SendControlees(const char* caller, uint32_t hw_index, uint
       !EndCallMessage(msg.get(), region_nest, params_nest)) {
     return false;
   }
-  return socket_factory_->SendAndAwaitAck(msg.get());
+  return socket_factory_->SendAndAwaitAck(msg.get(), LOG_TAG);
 }
 
 bool FiraRegionUtils::AddControlees(uint32_t hw_index, uint32_t session_id,
@@ -642,7 +642,7 @@ bool FiraRegionUtils::RemoveControlees(uint32_t hw_index, uint32_t session_id,
 
 bool FiraRegionUtils::UpdateBlockStriding(uint32_t hw_index, uint32_t session_id, uint32_t value) {
   LOG(INFO) << __func__;
-  UniqueNlMsg msg;
+  UniqueNlMsg msg(LOG_TAG);
   nlattr* region_nest = nullptr;
   nlattr* params_nest = nullptr;
   if (!StartCallMessage(msg.get(), hw_index, FIRA_CALL_SESSION_SET_PARAMS, &region_nest,
@@ -659,7 +659,7 @@ bool FiraRegionUtils::UpdateBlockStriding(uint32_t hw_index, uint32_t session_id
     return false;
   }
   if (!EndCallMessage(msg.get(), region_nest, params_nest)) return false;
-  return socket_factory_->SendAndAwaitAck(msg.get());
+  return socket_factory_->SendAndAwaitAck(msg.get(), LOG_TAG);
 }
 
 // ---- Notifications --------------------------------------------------------

@@ -58,7 +58,7 @@ bool IeeeUtils::SetIeeeCommand(nl_msg* msg, const char* iface, uint8_t cmd, int 
 std::vector<DevInfo> IeeeUtils::ListDevices(bool* ok) {
   LOG(INFO) << "ListDevices";
   std::vector<DevInfo> devices;
-  UniqueNlMsg msg;
+  UniqueNlMsg msg(LOG_TAG);
   genlmsg_put(msg.get(), NL_AUTO_PORT, NL_AUTO_SEQ, family_id_, 0, NLM_F_DUMP,
               NL802154_CMD_GET_INTERFACE, 0);
   *ok = factory_->SendAndAwaitResponse(
@@ -73,13 +73,13 @@ std::vector<DevInfo> IeeeUtils::ListDevices(bool* ok) {
         devices.push_back(DevInfo{nla_get_string(attrs[NL802154_ATTR_IFNAME]),
                                   nla_get_u32(attrs[NL802154_ATTR_WPAN_PHY])});
       },
-      NL802154_CMD_NEW_INTERFACE);
+      NL802154_CMD_NEW_INTERFACE, LOG_TAG);
   return devices;
 }
 
 bool IeeeUtils::GetPhyInfo(const char* iface, PhyInfo* info) {
   LOG(INFO) << "GetPhyInfo";
-  UniqueNlMsg msg;
+  UniqueNlMsg msg(LOG_TAG);
   if (!SetIeeeCommand(msg.get(), iface, NL802154_CMD_GET_WPAN_PHY, 0)) return false;
   bool parsed = false;
   const bool sent = factory_->SendAndAwaitResponse(
@@ -119,19 +119,19 @@ bool IeeeUtils::GetPhyInfo(const char* iface, PhyInfo* info) {
         }
         parsed = true;
       },
-      NL802154_CMD_NEW_WPAN_PHY);
+      NL802154_CMD_NEW_WPAN_PHY, LOG_TAG);
   return sent && parsed;
 }
 
 bool IeeeUtils::SetPanId(const char* iface, uint16_t pan_id) {
   LOG(INFO) << "SetPanId: Set pan id to " << pan_id;
-  UniqueNlMsg msg;
+  UniqueNlMsg msg(LOG_TAG);
   if (!SetIeeeCommand(msg.get(), iface, NL802154_CMD_SET_PAN_ID, 0)) return false;
   if (nla_put_u16(msg.get(), NL802154_ATTR_PAN_ID, pan_id) != 0) {
     LOG(ERROR) << "SetPanId: Error creating IEEE message";
     return false;
   }
-  return factory_->SendAndAwaitAck(msg.get());
+  return factory_->SendAndAwaitAck(msg.get(), LOG_TAG);
 }
 
 bool IeeeUtils::SetChannel(const char* iface, int channel) {
@@ -140,14 +140,14 @@ bool IeeeUtils::SetChannel(const char* iface, int channel) {
   if (static_cast<unsigned int>(channel) > static_cast<unsigned int>(kNl802154MaxChannel)) {
     return false;
   }
-  UniqueNlMsg msg;
+  UniqueNlMsg msg(LOG_TAG);
   if (!SetIeeeCommand(msg.get(), iface, NL802154_CMD_SET_CHANNEL, 0)) return false;
   if (nla_put_u8(msg.get(), NL802154_ATTR_PAGE, kNl802154UwbPage) != 0 ||
       nla_put_u8(msg.get(), NL802154_ATTR_CHANNEL, static_cast<uint8_t>(channel)) != 0) {
     LOG(ERROR) << "SetChannel: Error creating IEEE message";
     return false;
   }
-  return factory_->SendAndAwaitAck(msg.get());
+  return factory_->SendAndAwaitAck(msg.get(), LOG_TAG);
 }
 
 bool IeeeUtils::SetShortMacAddress(const char* iface, const std::vector<uint8_t>& address) {
@@ -155,7 +155,7 @@ bool IeeeUtils::SetShortMacAddress(const char* iface, const std::vector<uint8_t>
     LOG(ERROR) << "SetShortMacAddress: Incorrect short address, size is " << address.size();
     return false;
   }
-  UniqueNlMsg msg;
+  UniqueNlMsg msg(LOG_TAG);
   if (!SetIeeeCommand(msg.get(), iface, NL802154_CMD_SET_SHORT_ADDR, 0)) return false;
   bool converted = false;
   const uint16_t short_address = ToShortAddress(address, &converted);
@@ -167,7 +167,7 @@ bool IeeeUtils::SetShortMacAddress(const char* iface, const std::vector<uint8_t>
     LOG(ERROR) << "SetShortMacAddress: Error creating IEEE message";
     return false;
   }
-  return factory_->SendAndAwaitAck(msg.get());
+  return factory_->SendAndAwaitAck(msg.get(), LOG_TAG);
 }
 
 }  // namespace dalix

@@ -166,16 +166,19 @@ constexpr nla_policy Policy(uint16_t type, uint16_t maxlen = 0) {
   return policy;
 }
 
-// An exact length for a type that libnl would read past a short attribute.
-constexpr nla_policy SignedPolicy(uint16_t type, uint16_t length) {
-  nla_policy policy = Policy(type, length);
-  policy.minlen = length;
+// An integer read with nla_get_*: exactly |width| bytes. libnl checks no
+// minimum for its signed types, so every integer entry states its width.
+constexpr nla_policy Integer(uint16_t type, uint16_t width) {
+  nla_policy policy{};
+  policy.type = type;
+  policy.minlen = width;
+  policy.maxlen = width;
   return policy;
 }
 
 constexpr McpsPolicy<MCPS802154_ATTR_MAX> NewHwPolicy() {
   McpsPolicy<MCPS802154_ATTR_MAX> policy{};
-  policy[MCPS802154_ATTR_HW] = Policy(NLA_U32);
+  policy[MCPS802154_ATTR_HW] = Integer(NLA_U32, sizeof(uint32_t));
   policy[MCPS802154_ATTR_WPAN_PHY_NAME] = Policy(NLA_STRING, kMcpsNameMaxLen);
   policy[MCPS802154_ATTR_SCHEDULER_NAME] = Policy(NLA_STRING, kMcpsNameMaxLen);
   return policy;
@@ -184,24 +187,23 @@ constexpr McpsPolicy<MCPS802154_ATTR_MAX> NewHwPolicy() {
 constexpr McpsPolicy<MCPS802154_CALIBRATION_ATTR_MAX> CalibrationPolicy() {
   McpsPolicy<MCPS802154_CALIBRATION_ATTR_MAX> policy{};
   policy[MCPS802154_CALIBRATION_ATTR_KEY] = Policy(NLA_STRING, kMcpsCalibrationKeyMaxLen);
-  policy[MCPS802154_CALIBRATION_ATTR_STATUS] = Policy(NLA_S32);
+  policy[MCPS802154_CALIBRATION_ATTR_STATUS] = Integer(NLA_S32, sizeof(int32_t));
   return policy;
 }
 
 constexpr McpsPolicy<MCPS802154_ATTR_MAX> RangingReportPolicy() {
   McpsPolicy<MCPS802154_ATTR_MAX> policy{};
-  policy[MCPS802154_ATTR_HW] = Policy(NLA_U32);
+  policy[MCPS802154_ATTR_HW] = Integer(NLA_U32, sizeof(uint32_t));
   policy[MCPS802154_ATTR_RANGING_RESULT] = Policy(NLA_NESTED);
   return policy;
 }
 
 constexpr McpsPolicy<MCPS802154_RANGING_RESULT_ATTR_MAX> RangingResultPolicy() {
   McpsPolicy<MCPS802154_RANGING_RESULT_ATTR_MAX> policy{};
-  policy[MCPS802154_RANGING_RESULT_ATTR_REQUEST_ID] = Policy(NLA_U32);
-  policy[MCPS802154_RANGING_RESULT_ATTR_MEASUREMENT] = Policy(NLA_U32);
-  // Read as signed: libnl bounds no signed type by itself.
-  policy[MCPS802154_RANGING_RESULT_ATTR_PDOA_1] = SignedPolicy(NLA_S32, sizeof(int32_t));
-  policy[MCPS802154_RANGING_RESULT_ATTR_PDOA_2] = SignedPolicy(NLA_S32, sizeof(int32_t));
+  policy[MCPS802154_RANGING_RESULT_ATTR_REQUEST_ID] = Integer(NLA_U32, sizeof(uint32_t));
+  policy[MCPS802154_RANGING_RESULT_ATTR_MEASUREMENT] = Integer(NLA_U32, sizeof(uint32_t));
+  policy[MCPS802154_RANGING_RESULT_ATTR_PDOA_1] = Integer(NLA_S32, sizeof(int32_t));
+  policy[MCPS802154_RANGING_RESULT_ATTR_PDOA_2] = Integer(NLA_S32, sizeof(int32_t));
   return policy;
 }
 
@@ -213,32 +215,32 @@ constexpr McpsPolicy<MCPS802154_ATTR_MAX> TestModeReplyPolicy() {
 
 constexpr McpsPolicy<KX7200_TM_ATTR_MAX> TestDataReplyPolicy() {
   McpsPolicy<KX7200_TM_ATTR_MAX> policy{};
-  policy[KX7200_TM_ATTR_CCC_CMD_RC] = Policy(NLA_U8);
+  policy[KX7200_TM_ATTR_CCC_CMD_RC] = Integer(NLA_U8, sizeof(uint8_t));
   return policy;
 }
 
 // What the driver accepts inside a test-mode request.
 constexpr McpsPolicy<KX7200_TM_ATTR_MAX> TestDataRequestPolicy() {
   McpsPolicy<KX7200_TM_ATTR_MAX> policy{};
-  policy[KX7200_TM_ATTR_CMD] = Policy(NLA_U32, sizeof(uint32_t));
-  policy[KX7200_TM_ATTR_CCC_U32_PARAM] = Policy(NLA_U32, sizeof(uint32_t));
-  policy[KX7200_TM_ATTR_CCC_CHANNEL] = Policy(NLA_U8, sizeof(uint8_t));
+  policy[KX7200_TM_ATTR_CMD] = Integer(NLA_U32, sizeof(uint32_t));
+  policy[KX7200_TM_ATTR_CCC_U32_PARAM] = Integer(NLA_U32, sizeof(uint32_t));
+  policy[KX7200_TM_ATTR_CCC_CHANNEL] = Integer(NLA_U8, sizeof(uint8_t));
   return policy;
 }
 
 // What the driver accepts in one ranging request element.
 constexpr McpsPolicy<MCPS802154_RANGING_REQUEST_ATTR_MAX> RangingRequestPolicy() {
   McpsPolicy<MCPS802154_RANGING_REQUEST_ATTR_MAX> policy{};
-  policy[MCPS802154_RANGING_REQUEST_ATTR_ID] = Policy(NLA_U32, sizeof(uint32_t));
-  policy[MCPS802154_RANGING_REQUEST_ATTR_PARAMETER] = Policy(NLA_U32, sizeof(uint32_t));
-  policy[MCPS802154_RANGING_REQUEST_ATTR_PEER] = Policy(NLA_U64, sizeof(uint64_t));
+  policy[MCPS802154_RANGING_REQUEST_ATTR_ID] = Integer(NLA_U32, sizeof(uint32_t));
+  policy[MCPS802154_RANGING_REQUEST_ATTR_PARAMETER] = Integer(NLA_U32, sizeof(uint32_t));
+  policy[MCPS802154_RANGING_REQUEST_ATTR_PEER] = Integer(NLA_U64, sizeof(uint64_t));
   return policy;
 }
 
 // What the driver accepts in requests.
 constexpr McpsPolicy<MCPS802154_ATTR_MAX> RequestPolicy() {
   McpsPolicy<MCPS802154_ATTR_MAX> policy{};
-  policy[MCPS802154_ATTR_HW] = Policy(NLA_U32);
+  policy[MCPS802154_ATTR_HW] = Integer(NLA_U32, sizeof(uint32_t));
   policy[MCPS802154_ATTR_SCHEDULER_NAME] = Policy(NLA_STRING, kMcpsNameMaxLen);
   policy[MCPS802154_ATTR_SCHEDULER_PARAMS] = Policy(NLA_NESTED);
   policy[MCPS802154_ATTR_SCHEDULER_REGIONS] = Policy(NLA_NESTED);
@@ -251,8 +253,8 @@ constexpr McpsPolicy<MCPS802154_ATTR_MAX> RequestPolicy() {
 
 constexpr McpsPolicy<MCPS802154_SCHEDULER_PARAMS_ATTR_MAX> SchedulerParamsPolicy() {
   McpsPolicy<MCPS802154_SCHEDULER_PARAMS_ATTR_MAX> policy{};
-  policy[MCPS802154_SCHEDULER_PARAMS_ATTR_SLOT_DURATION] = Policy(NLA_U32, sizeof(uint32_t));
-  policy[MCPS802154_SCHEDULER_PARAMS_ATTR_NODE_TYPE] = Policy(NLA_U32, sizeof(uint32_t));
+  policy[MCPS802154_SCHEDULER_PARAMS_ATTR_SLOT_DURATION] = Integer(NLA_U32, sizeof(uint32_t));
+  policy[MCPS802154_SCHEDULER_PARAMS_ATTR_NODE_TYPE] = Integer(NLA_U32, sizeof(uint32_t));
   return policy;
 }
 
@@ -265,7 +267,7 @@ constexpr McpsPolicy<MCPS802154_REGION_ATTR_MAX> RegionPolicy() {
 constexpr McpsPolicy<MCPS802154_CALIBRATION_ATTR_MAX> CalibrationRequestPolicy() {
   McpsPolicy<MCPS802154_CALIBRATION_ATTR_MAX> policy{};
   policy[MCPS802154_CALIBRATION_ATTR_KEY] = Policy(NLA_STRING);
-  policy[MCPS802154_CALIBRATION_ATTR_VALUE] = Policy(NLA_U32, sizeof(uint32_t));
+  policy[MCPS802154_CALIBRATION_ATTR_VALUE] = Integer(NLA_U32, sizeof(uint32_t));
   return policy;
 }
 

@@ -30,12 +30,15 @@ int CalibrationElementOverhead() { return nla_total_size(0) + nla_total_size(siz
 // Parses a calibration value as decimal, then as hexadecimal (with or without
 // 0x). Anything else, even with a valid prefix, is refused; so is an empty
 // value, which would otherwise reach the radio as 0.
-bool ParseCalibrationValue(const char* text, uint32_t* value) {
-  if (*text == '\0') return false;
+// A NUL inside the text ends the conversion short of the text's end, so
+// such a value is refused too.
+bool ParseCalibrationValue(const std::string& text, uint32_t* value) {
+  if (text.empty()) return false;
+  const char* text_end = text.c_str() + text.size();
   char* end = nullptr;
-  long parsed = strtol(text, &end, 10);
-  if (*end != '\0') parsed = strtol(text, &end, 16);
-  if (*end != '\0') return false;
+  long parsed = strtol(text.c_str(), &end, 10);
+  if (end != text_end) parsed = strtol(text.c_str(), &end, 16);
+  if (end != text_end) return false;
   *value = static_cast<uint32_t>(parsed);
   return true;
 }
@@ -120,7 +123,7 @@ uint32_t McpsUtils::GetNetId() const { return net_id_; }
 std::vector<McpsHwInfo> McpsUtils::ListHardware(bool* ok) {
   LOG(INFO) << __func__;
   std::vector<McpsHwInfo> radios;
-  UniqueNlMsg msg;
+  UniqueNlMsg msg(LOG_TAG);
   // A dump request carries no hardware index, so SetMcpsCommand does not apply.
   genlmsg_put(msg.get(), NL_AUTO_PORT, NL_AUTO_SEQ, net_id_, 0, NLM_F_DUMP,
               MCPS802154_CMD_GET_HW, 0);
@@ -130,21 +133,22 @@ std::vector<McpsHwInfo> McpsUtils::ListHardware(bool* ok) {
         McpsHwInfo info;
         if (ParseHwInfo(reply, &info)) radios.push_back(info);
       },
-      MCPS802154_CMD_NEW_HW);
+      MCPS802154_CMD_NEW_HW, LOG_TAG);
   return radios;
 }
 
 McpsHwInfo McpsUtils::GetHardwareInfo(uint32_t hw_index, bool* ok) {
   LOG(INFO) << __func__;
   McpsHwInfo info;
-  UniqueNlMsg msg;
+  UniqueNlMsg msg(LOG_TAG);
   if (!SetMcpsCommand(msg.get(), hw_index, MCPS802154_CMD_GET_HW, 0)) {
     *ok = false;
     return info;
   }
   // A partial reply still counts: callers go by the exchange's result.
   *ok = socket_factory_->SendAndAwaitResponse(
-      msg.get(), [&info](nl_msg* reply) { ParseHwInfo(reply, &info); }, MCPS802154_CMD_NEW_HW);
+      msg.get(), [&info](nl_msg* reply) { ParseHwInfo(reply, &info); }, MCPS802154_CMD_NEW_HW,
+      LOG_TAG);
   return info;
 }
 
@@ -163,7 +167,7 @@ std::string McpsUtils::SchedulerName(McpsScheduler scheduler) {
 bool McpsUtils::SetScheduler(uint32_t hw_index, McpsScheduler scheduler,
                              SlotDuration slot_duration, NodeType node_type, bool params_only) {
   LOG(INFO) << __func__;
-  UniqueNlMsg msg;
+  UniqueNlMsg msg(LOG_TAG);
   uint8_t cmd = params_only ? MCPS802154_CMD_SET_SCHEDULER_PARAMS : MCPS802154_CMD_SET_SCHEDULER;
   if (!SetMcpsCommand(msg.get(), hw_index, cmd, 0)) return false;
 
@@ -191,12 +195,12 @@ bool McpsUtils::SetScheduler(uint32_t hw_index, McpsScheduler scheduler,
     LOG(ERROR) << __func__ << " Error creating MCPS message";
     return false;
   }
-  return socket_factory_->SendAndAwaitAck(msg.get());
+  return socket_factory_->SendAndAwaitAck(msg.get(), LOG_TAG);
 }
 
 bool McpsUtils::SetFiraRegion(uint32_t hw_index) {
   LOG(INFO) << __func__;
-  UniqueNlMsg msg;
+  UniqueNlMsg msg(LOG_TAG);
   if (!SetMcpsCommand(msg.get(), hw_index, MCPS802154_CMD_SET_SCHEDULER, 0)) return false;
 
   auto put_attributes = [&]() {
@@ -214,7 +218,7 @@ bool McpsUtils::SetFiraRegion(uint32_t hw_index) {
     LOG(ERROR) << __func__ << ": Error creating MCPS message";
     return false;
   }
-  return socket_factory_->SendAndAwaitAck(msg.get());
+  return socket_factory_->SendAndAwaitAck(msg.get(), LOG_TAG);
 }
 
 int McpsUtils::CalibrationPayloadBudget() { return getpagesize() - NLMSG_HDRLEN; }
@@ -238,7 +242,7 @@ bool McpsUtils::SetCalibration(uint32_t hw_index, ConfigUtils* config) {
   int status = 0;
 
   while (key != end && status == 0) {
-    UniqueNlMsg msg;
+    UniqueNlMsg msg(LOG_TAG);
     if (!SetMcpsCommand(msg.get(), hw_index, MCPS802154_CMD_SET_CALIBRATIONS, 0)) return false;
     nlattr* calibrations =
         nla_nest_start(msg.get(), MCPS802154_ATTR_CALIBRATIONS | NLA_F_NESTED);
@@ -252,24 +256,28 @@ bool McpsUtils::SetCalibration(uint32_t hw_index, ConfigUtils* config) {
     int added = 0;
 
     for (; key != end; ++key) {
-      const char* name = key->first.c_str();
-      const int key_size = nla_total_size(static_cast<int>(strlen(name)) + 1);
+      // The key and value go out as the store holds them, a NUL inside the
+      // key included: looked up or sent by its C string, such a key would
+      // stand for a shorter one.
+      const std::string& name = key->first;
+      const int key_length = static_cast<int>(name.size()) + 1;
+      const int key_size = nla_total_size(key_length);
       if (key_size > key_room) {
         LOG(ERROR) << "Skip incorrect key " << name;
         skipped = true;
         continue;
       }
       if (length + overhead + key_size > budget) break;  // starts the next message
-      const char* text = config->GetValue(name);
       uint32_t value = 0;
-      if (text == nullptr || !ParseCalibrationValue(text, &value)) {
+      if (!ParseCalibrationValue(key->second, &value)) {
         LOG(WARNING) << "Skip incorrect key " << name;
         skipped = true;
         continue;
       }
       nlattr* element = nla_nest_start(msg.get(), MCPS802154_CALIBRATIONS_ATTR_CALIBRATION |
                                                       NLA_F_NESTED);
-      if (element == nullptr || nla_put_string(msg.get(), MCPS802154_CALIBRATION_ATTR_KEY, name) ||
+      if (element == nullptr ||
+          nla_put(msg.get(), MCPS802154_CALIBRATION_ATTR_KEY, key_length, name.c_str()) ||
           nla_put_u32(msg.get(), MCPS802154_CALIBRATION_ATTR_VALUE, value) ||
           nla_nest_end(msg.get(), element)) {
         LOG(ERROR) << "PutCalibrationKeys: Error creating MCPS message";
@@ -306,7 +314,7 @@ bool McpsUtils::SetRangingRequests(uint32_t hw_index, const std::vector<RangingR
   }
   std::shared_ptr<NlSocket> socket = socket_factory_->Create();
   if (!socket) return false;
-  UniqueNlMsg msg;
+  UniqueNlMsg msg(LOG_TAG);
   if (!RangingRequestsToNlMsg(msg.get(), hw_index, requests)) return false;
   if (!socket->SendAndAwaitAck(msg.get(), nullptr)) return false;
   // Reports come unasked, with sequence 0: nothing to acknowledge or match.
@@ -431,11 +439,10 @@ bool McpsUtils::RangingRequestsToNlMsg(nl_msg* msg, uint32_t hw_index,
 
 bool McpsUtils::ParseHwInfo(nl_msg* msg, McpsHwInfo* info) {
   nlattr* attrs[MCPS802154_ATTR_MAX + 1] = {};
-  if (genlmsg_parse(nlmsg_hdr(msg), 0, attrs, MCPS802154_ATTR_MAX, kMcpsNewHwPolicy.data()) !=
-      0) {
-    LOG(WARNING) << __func__ << ": Failed to parse mcps attributes";
-    return false;
-  }
+  // The verdict is not needed: libnl keeps every attribute ahead of one that
+  // breaks the policy and leaves the rest out, so a broken index or phy name
+  // is reported below as missing, and a broken scheduler name reads as absent.
+  genlmsg_parse(nlmsg_hdr(msg), 0, attrs, MCPS802154_ATTR_MAX, kMcpsNewHwPolicy.data());
   if (attrs[MCPS802154_ATTR_HW] == nullptr || attrs[MCPS802154_ATTR_WPAN_PHY_NAME] == nullptr) {
     LOG(WARNING) << __func__ << ": Missing mcps attribute";
     return false;

@@ -64,14 +64,20 @@ using Nl802154CapabilityPolicy = std::array<nla_policy, NL802154_CAP_ATTR_MAX + 
 inline const Nl802154Policy& Nl802154AttributePolicy() {
   static const Nl802154Policy policy = [] {
     Nl802154Policy p{};
-    p[NL802154_ATTR_WPAN_PHY].type = NLA_U32;
-    p[NL802154_ATTR_IFINDEX].type = NLA_U32;
+    // Integers are read with nla_get_* at exactly their width.
+    auto integer = [&p](int attr, uint16_t type, uint16_t width) {
+      p[attr].type = type;
+      p[attr].minlen = width;
+      p[attr].maxlen = width;
+    };
+    integer(NL802154_ATTR_WPAN_PHY, NLA_U32, sizeof(uint32_t));
+    integer(NL802154_ATTR_IFINDEX, NLA_U32, sizeof(uint32_t));
     p[NL802154_ATTR_IFNAME].type = NLA_STRING;
     p[NL802154_ATTR_IFNAME].maxlen = IFNAMSIZ;
-    p[NL802154_ATTR_PAGE].type = NLA_U8;
-    p[NL802154_ATTR_CHANNEL].type = NLA_U8;
-    p[NL802154_ATTR_PAN_ID].type = NLA_U16;
-    p[NL802154_ATTR_SHORT_ADDR].type = NLA_U16;
+    integer(NL802154_ATTR_PAGE, NLA_U8, sizeof(uint8_t));
+    integer(NL802154_ATTR_CHANNEL, NLA_U8, sizeof(uint8_t));
+    integer(NL802154_ATTR_PAN_ID, NLA_U16, sizeof(uint16_t));
+    integer(NL802154_ATTR_SHORT_ADDR, NLA_U16, sizeof(uint16_t));
     p[NL802154_ATTR_WPAN_PHY_CAPS].type = NLA_NESTED;
     return p;
   }();

@@ -7,11 +7,19 @@
 namespace hardware {
 namespace dalix {
 
-// Owns one libnl message for the duration of a request. Header-only, so a
-// failed allocation is reported under the including file's log tag.
+// Owns one libnl message for the duration of a request. A failed allocation
+// is fatal; its line goes under |log_tag|, which callers give as their own
+// LOG_TAG (the tag is a parameter, not the macro, so that every file sees the
+// same inline body), or under the process's default tag when none is given.
 class UniqueNlMsg {
  public:
-  UniqueNlMsg() : msg_(nlmsg_alloc()) { CHECK(msg_) << "BAD ALLOC IN UniqueNlMsg constructor"; }
+  UniqueNlMsg() : UniqueNlMsg(nullptr) {}
+  explicit UniqueNlMsg(const char* log_tag) : msg_(nlmsg_alloc()) {
+    if (msg_ == nullptr) {
+      android::base::LogMessage(__FILE__, __LINE__, android::base::FATAL, log_tag, -1).stream()
+          << "Check failed: msg_ BAD ALLOC IN UniqueNlMsg constructor";
+    }
+  }
   ~UniqueNlMsg() {
     if (msg_ != nullptr) nlmsg_free(msg_);
   }

@@ -96,17 +96,12 @@ TEST_F(ConfigUtilsTest, ParsesLinesByTheFileRules) {
 }
 
 TEST_F(ConfigUtilsTest, HostileFilesLoadWithoutHarm) {
+  // Arbitrary bytes are the config fuzzer's; a line longer than any buffer
+  // must still not be cut in two.
   std::string long_value(1 << 20, 'v');
-  std::string binary;
-  for (int i = 0; i < 4096; ++i) binary.push_back(static_cast<char>(i * 7919 % 256));
-
   ASSERT_TRUE(store_.Load(WriteFile("long.conf", "key=" + long_value + "\nafter=1\n").c_str()));
   EXPECT_EQ(long_value, store_.GetValue("key"));
   EXPECT_STREQ("1", store_.GetValue("after"));
-
-  ConfigUtils binary_store;
-  EXPECT_TRUE(binary_store.Load(WriteFile("bin.conf", binary + "\nok=yes\n").c_str()));
-  EXPECT_STREQ("yes", binary_store.GetValue("ok"));
 
   // A NUL inside a line is part of it, not its end.
   ConfigUtils nul_store;

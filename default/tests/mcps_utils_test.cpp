@@ -13,6 +13,7 @@
 #include <utility>
 #include <vector>
 
+#include <android-base/file.h>
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 #include <netlink/attr.h>
@@ -202,8 +203,16 @@ TEST_F(McpsUtilsTest, CalibrationSendsParsableKeysInOrderWithinOnePagePerMessage
       {"a_dec", "12"},   {"b_hex", "1F"},   {"c_0x", "0x1F"}, {"d_frac", "1.5"},
       {"e_text", "xyz"}, {"e_word", "abc"}, {"f_neg", "-1"},  {"g_empty", ""}};
   for (auto [key, value] : values) store_.Set(key, value);
+  // Keys and values read from a file may hold a NUL: each key goes out whole
+  // with its own value, and a value cut by a NUL is no number.
+  const std::string nul_key("h_nul\0x", 7);
+  const std::string path = ::testing::TempDir() + "calibration_with_nul.conf";
+  ASSERT_TRUE(android::base::WriteStringToFile(
+      nul_key + " = 9\nh_nul = 4\nh_nulv = " + std::string("5\0z", 3) + "\n", path));
+  ASSERT_TRUE(store_.Load(path.c_str()));
   std::vector<std::pair<std::string, uint32_t>> expected = {
-      {"a_dec", 12}, {"b_hex", 31}, {"c_0x", 31}, {"e_word", 0xabc}, {"f_neg", 0xffffffff}};
+      {"a_dec", 12},        {"b_hex", 31}, {"c_0x", 31},   {"e_word", 0xabc},
+      {"f_neg", 0xffffffff}, {"h_nul", 4},  {nul_key, 9}};
   for (uint32_t i = 0; i < 600; ++i) {
     char key[16];
     snprintf(key, sizeof(key), "key_%04u", i);
@@ -239,11 +248,12 @@ TEST_F(McpsUtilsTest, CalibrationSendsParsableKeysInOrderWithinOnePagePerMessage
       ASSERT_EQ(
           std::make_tuple(f[0]->nla_type, f[1]->nla_type, nla_len(f[1])),
           std::make_tuple(MCPS802154_CALIBRATION_ATTR_KEY, MCPS802154_CALIBRATION_ATTR_VALUE, 4));
-      keys.emplace_back(nla_get_string(f[0]), nla_get_u32(f[1]));
+      keys.emplace_back(std::string(static_cast<char*>(nla_data(f[0])), nla_len(f[0]) - 1),
+                        nla_get_u32(f[1]));
     }
   }
   EXPECT_EQ(keys, expected);
-  for (const char* key : {"d_frac", "e_text", "g_empty"}) {
+  for (const char* key : {"d_frac", "e_text", "g_empty", "h_nulv"}) {
     EXPECT_TRUE(log_.Contains(WARNING, std::string("Skip incorrect key ") + key, kTag)) << key;
   }
   EXPECT_EQ(log_.Count(ERROR, "Skip incorrect key " + too_long, kTag), 1);

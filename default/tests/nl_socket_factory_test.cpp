@@ -7,10 +7,13 @@
 #include <unistd.h>
 
 #include <memory>
+#include <string>
 
 #include <gtest/gtest.h>
 #include <netlink/genl/genl.h>
 
+#include "net/ieee_utils.h"
+#include "net/mcps_utils.h"
 #include "net/unique_nl_msg.h"
 #include "sim/driver_simulator.h"
 #include "sim/sim_nl_socket_factory.h"
@@ -58,23 +61,32 @@ TEST(NlSocketFactoryTest, NothingWithoutDescriptors) {
     UniqueNlMsg msg;  // never sent
     bool called = false;
     std::unique_ptr<NlSocket> socket;
-    bool acked, answered;
+    bool acked, answered, mcps_acked, ieee_listed;
+    McpsUtils mcps(factory);
+    IeeeUtils ieee(factory);
     {
       DescriptorsExhausted exhausted;
       socket = factory->Create();
-      acked = factory->SendAndAwaitAck(msg.get());
+      acked = factory->SendAndAwaitAck(msg.get(), "dalix.uwb.Caller");
       answered = factory->SendAndAwaitResponse(
-          msg.get(), [&called](nl_msg*) { called = true; }, sim::kTestCmdValue);
+          msg.get(), [&called](nl_msg*) { called = true; }, sim::kTestCmdValue,
+          "dalix.uwb.Caller");
+      // Two clients built into one program: each line names its own client,
+      // whatever order the objects were linked in.
+      mcps_acked = mcps.SetFiraRegion(0);
+      ieee.ListDevices(&ieee_listed);
     }
     EXPECT_EQ(nullptr, socket);
-    EXPECT_FALSE(acked || answered || called);
-    EXPECT_EQ(3,
+    EXPECT_FALSE(acked || answered || called || mcps_acked || ieee_listed);
+    EXPECT_EQ(5,
               log.Count(ERROR, "Setup: Failed to connect to generic netlink", "dalix.uwb.NlSocket"))
         << log.Text();
-    // The one-shots log under their caller's tag.
-    EXPECT_EQ(1, log.Count(ERROR, "SendAndAwaitAck: BAD_ALLOC: cannot allocate NlSocket", LOG_TAG));
-    EXPECT_EQ(
-        1, log.Count(ERROR, "SendAndAwaitResponse: BAD_ALLOC: cannot allocate NlSocket", LOG_TAG));
+    const std::string ack_line = "SendAndAwaitAck: BAD_ALLOC: cannot allocate NlSocket";
+    EXPECT_EQ(1, log.Count(ERROR, ack_line, "dalix.uwb.Caller"));
+    EXPECT_EQ(1, log.Count(ERROR, ack_line, "dalix.uwb.McpsUtils")) << log.Text();
+    const std::string response_line = "SendAndAwaitResponse: BAD_ALLOC: cannot allocate NlSocket";
+    EXPECT_EQ(1, log.Count(ERROR, response_line, "dalix.uwb.Caller"));
+    EXPECT_EQ(1, log.Count(ERROR, response_line, "dalix.uwb.IeeeUtils")) << log.Text();
   }
 }
 
@@ -87,7 +99,7 @@ TEST(NlSocketFactoryTest, OneShotsUseASocketOfTheirOwn) {
 
   UniqueNlMsg set = sim::TestFamily::NewRequest(family_id, sim::kTestCmdSet);
   nla_put_u32(set.get(), sim::kTestAttrValue, 77);
-  EXPECT_TRUE(factory.SendAndAwaitAck(set.get()));
+  EXPECT_TRUE(factory.SendAndAwaitAck(set.get(), LOG_TAG));
   uint32_t value = 0;
   UniqueNlMsg get = sim::TestFamily::NewRequest(family_id, sim::kTestCmdGet);
   EXPECT_TRUE(factory.SendAndAwaitResponse(
@@ -96,7 +108,7 @@ TEST(NlSocketFactoryTest, OneShotsUseASocketOfTheirOwn) {
         nlattr* attr = nlmsg_find_attr(nlmsg_hdr(msg), GENL_HDRLEN, sim::kTestAttrValue);
         if (attr != nullptr) value = nla_get_u32(attr);
       },
-      sim::kTestCmdValue));
+      sim::kTestCmdValue, LOG_TAG));
   EXPECT_EQ(77u, value);
   // The caller still owns its message, intact.
   EXPECT_EQ(family_id, nlmsg_hdr(get.get())->nlmsg_type);

@@ -166,7 +166,7 @@ TEST_P(NlSocketExchangeTest, HandlesTheAnswer) {
   const bool ack = std::get<0>(GetParam());
   const Answer& answer = std::get<1>(GetParam());
   UniqueNlMsg set = Request(sim::kTestCmdSet, sim::kTestAttrValue, 42);
-  ASSERT_TRUE(factory_.SendAndAwaitAck(set.get()));
+  ASSERT_TRUE(factory_.SendAndAwaitAck(set.get(), LOG_TAG));
   simulator_.SetFault(sim::kTestFamilyName, answer.fault);
   if (answer.stop_simulator) simulator_.Stop();
   log_.Reset();

@@ -92,6 +92,9 @@ TEST_F(McpsFamilyTest, DiscoveryKeepsOnlyRadiosWithAUsablePhyName) {
     radios_.AddRadio(i, phy_names[i] ? std::optional<std::string>(phy_names[i]) : std::nullopt);
   }
   radios_.SetReportsScheduler(6, false);
+  // A scheduler name longer than the policy allows reads as none.
+  radios_.AddRadio(14, 5u);
+  radios_.SetScheduler(14, std::string(kMcpsNameMaxLen, 's'), -1, -1, {});
   radios_.SetScheduler(7, kMcpsSchedulerEndless, -1, -1, {kMcpsRegionFira});
   // A reply cut short inside its generic netlink header is dropped and does not
   // spoil the next dump.
@@ -106,9 +109,12 @@ TEST_F(McpsFamilyTest, DiscoveryKeepsOnlyRadiosWithAUsablePhyName) {
   EXPECT_TRUE(ok);
   std::vector<std::tuple<uint32_t, uint32_t, std::string>> expected = {
       {0, 0, "default"}, {1, 12, "default"}, {6, 3, "default"},
-      {7, 1, "endless"}, {8, 4, "default"},  {12, 1, "default"}};  // truncated to 32 bits
+      {7, 1, "endless"}, {8, 4, "default"},  {12, 1, "default"},  // truncated to 32 bits
+      {14, 5, "default"}};
   EXPECT_EQ(found, expected);
-  EXPECT_EQ(log_.Count(WARNING, "ParseHwInfo: Missing mcps attribute", kTag), 1) << log_.Text();
+  // The radio without a phy name and the one whose name is too long.
+  EXPECT_EQ(log_.Count(WARNING, "ParseHwInfo: Missing mcps attribute", kTag), 2) << log_.Text();
+  EXPECT_EQ(log_.Count(WARNING, "ParseHwInfo: Failed to parse mcps attributes", kTag), 0);
 
   // Index and scheduler are read before the phy name; nothing of a refused record is.
   McpsHwInfo info = mcps_.GetHardwareInfo(2, &ok);
@@ -120,6 +126,27 @@ TEST_F(McpsFamilyTest, DiscoveryKeepsOnlyRadiosWithAUsablePhyName) {
   info = mcps_.GetHardwareInfo(99, &ok);
   EXPECT_FALSE(ok);
   EXPECT_EQ(std::tie(info.hw_index, info.scheduler), std::make_tuple(0u, std::string()));
+}
+
+TEST_F(McpsFamilyTest, DumpsAreReadWholeHoweverPacked) {
+  // Packed, a few hundred radios fill several datagrams, NLMSG_DONE sharing
+  // the last. Unpacked, as many would overflow the client's receive buffer:
+  // the kernel writes a dump only as fast as it is read, the simulator at once.
+  const struct {
+    size_t datagram_bytes;
+    uint32_t radios;
+  } kCases[] = {{DriverSimulator::kDefaultDumpDatagramBytes, 300}, {0, 40}, {100, 40}};
+  for (const auto& c : kCases) {
+    SCOPED_TRACE(c.datagram_bytes);
+    for (uint32_t i = 0; i < c.radios; ++i) radios_.AddRadio(i, i + 1);
+    simulator_.SetDumpDatagramBytes(c.datagram_bytes);
+    bool ok = false;
+    std::vector<McpsHwInfo> found = mcps_.ListHardware(&ok);
+    EXPECT_TRUE(ok);
+    ASSERT_EQ(found.size(), c.radios);
+    for (uint32_t i = 0; i < c.radios; ++i) EXPECT_EQ(found[i].phy_index, i + 1);
+    for (uint32_t i = 0; i < c.radios; ++i) radios_.RemoveRadio(i);
+  }
 }
 
 TEST_F(McpsFamilyTest, SchedulerChangesAreCheckedAndKept) {

@@ -1,0 +1,259 @@
+// The root service end to end: the real start-up path on a service thread,
+// the simulated driver behind it, and a client calling through the host
+// binder from the test's thread.
+#include "uwb.h"
+
+#include <stdio.h>
+#include <unistd.h>
+
+#include <memory>
+#include <string>
+#include <vector>
+
+#include <aidl/aidl/hardware/dalix/uwb/BnUwbClientCallback.h>
+#include <android/binder_manager.h>
+#include <binder_host/host.h>
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include "net/mcps802154.h"
+#include "net/nl802154.h"
+#include "service_main.h"
+#include "sim/service_thread.h"
+#include "sim/simulated_driver.h"
+#include "tests/log_capture.h"
+
+namespace hardware {
+namespace dalix {
+namespace {
+
+namespace uwb = aidl::aidl::hardware::dalix::uwb;
+using ::testing::ElementsAre;
+using ::testing::IsEmpty;
+
+class Client : public uwb::BnUwbClientCallback {};
+
+class UwbTest : public ::testing::Test {
+ protected:
+  void SetUp() override { ASSERT_TRUE(driver_.Start()); }
+
+  void TearDown() override {
+    if (uwb_ != nullptr) EXPECT_TRUE(uwb_->close().isOk());
+    uwb_.reset();
+    service_.Stop();
+  }
+
+  void AddRadio(uint32_t hw_index, uint32_t phy, const std::string& ifname) {
+    std::string error;
+    ASSERT_TRUE(driver_.AddRadio(hw_index, phy, ifname, &error)) << error;
+  }
+
+  void StartService() {
+    service_.Start();
+    uwb_ = uwb::IUwb::fromBinder(
+        ndk::SpAIBinder(AServiceManager_checkService(ServiceInstanceName().c_str())));
+    ASSERT_NE(uwb_, nullptr);
+  }
+
+  std::vector<std::string> Names() {
+    std::vector<std::string> names;
+    EXPECT_TRUE(uwb_->listIfaceNames(&names).isOk());
+    return names;
+  }
+
+  bool IsUp(const std::string& ifname) {
+    std::optional<sim::WpanDevice> device = driver_.devices().FindByName(ifname);
+    return device.has_value() && device->up;
+  }
+
+  sim::SimulatedDriver driver_;
+  sim::ServiceThread service_{driver_.port(), &driver_.devices()};
+  std::shared_ptr<uwb::IUwb> uwb_;
+};
+
+struct OpenCase {
+  const char* name;
+  const char* missing_family;
+  int32_t service_specific;
+  const char* message;
+};
+
+class UwbOpenTest : public UwbTest, public ::testing::WithParamInterface<OpenCase> {};
+
+TEST_P(UwbOpenTest, OpensOnlyWithBothFamilies) {
+  AddRadio(0, 0, "wpan0");
+  if (GetParam().missing_family != nullptr) {
+    driver_.simulator().SetFamilyPresent(GetParam().missing_family, false);
+  }
+  StartService();
+  ndk::ScopedAStatus status = uwb_->open(ndk::SharedRefBase::make<Client>());
+  if (GetParam().message == nullptr) {
+    ASSERT_TRUE(status.isOk()) << status.getDescription();
+    EXPECT_THAT(Names(), ElementsAre("wpan0"));
+    return;
+  }
+  EXPECT_EQ(status.getExceptionCode(), EX_SERVICE_SPECIFIC);
+  EXPECT_EQ(status.getServiceSpecificError(), GetParam().service_specific);
+  EXPECT_STREQ(status.getMessage(), GetParam().message);
+  EXPECT_THAT(Names(), IsEmpty());
+  // Still closed: with the family back, a new client gets in.
+  driver_.simulator().SetFamilyPresent(GetParam().missing_family, true);
+  EXPECT_TRUE(uwb_->open(ndk::SharedRefBase::make<Client>()).isOk());
+}
+
+INSTANTIATE_TEST_SUITE_P(
+    Families, UwbOpenTest,
+    ::testing::Values(
+        OpenCase{"Both", nullptr, 0, nullptr},
+        OpenCase{"NoMcps", kMcpsFamilyName, 1,
+                 "Failed to find MCPS netlink, check the kernel module"},
+        OpenCase{"NoNl802154", kNl802154FamilyName, 1,
+                 "Failed to find IEEE netlink, check the kernel module"}),
+    [](const auto& info) { return std::string(info.param.name); });
+
+TEST_F(UwbTest, PairsDevicesWithRadiosByPhy) {
+  AddRadio(3, 1, "wpan1");  // its device is on phy 1
+  AddRadio(5, 0, "");       // a radio without a network device
+  sim::WpanDeviceConfig stray;
+  stray.name = "wpan9";     // a device on a phy no radio drives
+  stray.phy_index = 9;
+  std::string error;
+  ASSERT_TRUE(driver_.devices().AddDevice(stray, &error)) << error;
+  StartService();
+
+  EXPECT_THAT(Names(), IsEmpty());
+  ASSERT_TRUE(uwb_->open(ndk::SharedRefBase::make<Client>()).isOk());
+  std::vector<std::string> names = {"kept"};
+  ASSERT_TRUE(uwb_->listIfaceNames(&names).isOk());
+  EXPECT_THAT(names, ElementsAre("kept", "wpan1"));
+
+  std::vector<int64_t> indices;
+  ASSERT_TRUE(uwb_->listHardwareIndex(&indices).isOk());
+  EXPECT_THAT(indices, ElementsAre(3, 5));
+
+  std::shared_ptr<uwb::IUwbIface> iface;
+  EXPECT_TRUE(uwb_->getIface("wpan1", &iface).isOk());
+  EXPECT_NE(iface, nullptr);
+  std::shared_ptr<uwb::IUwbIface> unknown;
+  ndk::ScopedAStatus status = uwb_->getIface("wpan9", &unknown);
+  EXPECT_EQ(status.getExceptionCode(), EX_ILLEGAL_ARGUMENT);
+  EXPECT_STREQ(status.getMessage(), "Unknown iface wpan9");
+  EXPECT_EQ(unknown, nullptr);
+}
+
+TEST_F(UwbTest, HardwareListingRefusedIsAnUnknownError) {
+  AddRadio(0, 0, "wpan0");
+  StartService();
+  ASSERT_TRUE(uwb_->open(ndk::SharedRefBase::make<Client>()).isOk());
+  sim::Fault refuse;
+  refuse.kind = sim::Fault::Kind::kError;
+  refuse.error = EIO;
+  driver_.simulator().SetCommandFault(kMcpsFamilyName, MCPS802154_CMD_GET_HW, refuse);
+  std::vector<int64_t> indices = {42};
+  ndk::ScopedAStatus status = uwb_->listHardwareIndex(&indices);
+  EXPECT_EQ(status.getStatus(), STATUS_UNKNOWN_ERROR);
+  EXPECT_THAT(indices, ElementsAre(42));
+}
+
+TEST_F(UwbTest, OneLiveClientAtATimeAndADeadOneIsReplaced) {
+  AddRadio(0, 0, "wpan0");
+  StartService();
+  auto first = ndk::SharedRefBase::make<Client>();
+  ASSERT_TRUE(uwb_->open(first).isOk());
+  std::shared_ptr<uwb::IUwbIface> first_iface;
+  ASSERT_TRUE(uwb_->getIface("wpan0", &first_iface).isOk());
+
+  ndk::ScopedAStatus refused = uwb_->open(ndk::SharedRefBase::make<Client>());
+  EXPECT_EQ(refused.getExceptionCode(), EX_ILLEGAL_STATE);
+  EXPECT_STREQ(refused.getMessage(), "HAL is already open");
+  std::shared_ptr<uwb::IUwbIface> same;
+  ASSERT_TRUE(uwb_->getIface("wpan0", &same).isOk());
+  EXPECT_EQ(same->asBinder().get(), first_iface->asBinder().get());
+
+  // The second client opens once the first has died; the death is handled
+  // before the open because both go through the service thread in order.
+  ASSERT_TRUE(driver_.devices().FindByName("wpan0").has_value());
+  ndk::host::KillBinder(first->asBinder().get());
+  ASSERT_TRUE(uwb_->open(ndk::SharedRefBase::make<Client>()).isOk());
+  std::shared_ptr<uwb::IUwbIface> second_iface;
+  ASSERT_TRUE(uwb_->getIface("wpan0", &second_iface).isOk());
+  EXPECT_NE(second_iface->asBinder().get(), first_iface->asBinder().get());
+  EXPECT_FALSE(IsUp("wpan0"));
+}
+
+TEST_F(UwbTest, ClientDeathClosesTheHal) {
+  AddRadio(0, 0, "wpan0");
+  StartService();
+  auto client = ndk::SharedRefBase::make<Client>();
+  ASSERT_TRUE(uwb_->open(client).isOk());
+  LogCapture log;
+  ndk::host::KillBinder(client->asBinder().get());
+  EXPECT_THAT(Names(), IsEmpty());
+  EXPECT_TRUE(log.Contains(android::base::INFO, "LambdaOnDeath Uwb service has died", "dalix.Uwb"));
+}
+
+TEST_F(UwbTest, CloseOnAClosedHalOnlyLogsTheInternalClose) {
+  StartService();
+  LogCapture log;
+  EXPECT_TRUE(uwb_->close().isOk());
+  std::vector<LogCapture::Entry> service_lines;
+  for (const LogCapture::Entry& entry : log.Entries()) {
+    if (entry.tag.rfind("dalix.", 0) == 0) service_lines.push_back(entry);
+  }
+  ASSERT_EQ(service_lines.size(), 1u) << log.Text();
+  EXPECT_EQ(service_lines[0].message, "InternalClose");
+}
+
+struct CalibrationCase {
+  const char* name;
+  bool open;
+  int64_t hw_index;
+  bool file_exists;
+  binder_exception_t exception;
+  const char* message;
+};
+
+class UwbCalibrationTest : public UwbTest,
+                           public ::testing::WithParamInterface<CalibrationCase> {};
+
+TEST_P(UwbCalibrationTest, LoadsIntoTheRadioOfTheIndex) {
+  const CalibrationCase& test = GetParam();
+  AddRadio(7, 0, "wpan0");
+  StartService();
+  if (test.open) ASSERT_TRUE(uwb_->open(ndk::SharedRefBase::make<Client>()).isOk());
+  char path[] = "/tmp/uwb_calibration_XXXXXX";
+  const int fd = mkstemp(path);
+  ASSERT_GE(fd, 0);
+  const std::string content = "xtal_trim = 17\nch9.ant0.tx_delay = 16450\n";
+  ASSERT_EQ(write(fd, content.data(), content.size()), static_cast<ssize_t>(content.size()));
+  close(fd);
+  if (!test.file_exists) unlink(path);
+
+  ndk::ScopedAStatus status = uwb_->loadCalibration(test.hw_index, path);
+  unlink(path);
+  EXPECT_EQ(status.getExceptionCode(), test.exception);
+  if (test.message != nullptr) EXPECT_STREQ(status.getMessage(), test.message);
+  if (test.exception == EX_SERVICE_SPECIFIC) EXPECT_EQ(status.getServiceSpecificError(), 0);
+  const std::map<std::string, uint32_t> calibration = driver_.radios().Radio(7)->calibration;
+  if (test.exception == EX_NONE) {
+    EXPECT_EQ(calibration.at("xtal_trim"), 17u);
+    EXPECT_EQ(calibration.at("ch9.ant0.tx_delay"), 16450u);
+  } else {
+    EXPECT_EQ(calibration.count("xtal_trim"), 0u);
+  }
+}
+
+INSTANTIATE_TEST_SUITE_P(
+    Cases, UwbCalibrationTest,
+    ::testing::Values(
+        CalibrationCase{"NotOpen", false, 7, true, EX_ILLEGAL_STATE, "UWB HAL is not opened"},
+        CalibrationCase{"UnknownIndex", true, 8, true, EX_ILLEGAL_ARGUMENT, "Unkown hw index"},
+        CalibrationCase{"NegativeIndex", true, -1, true, EX_ILLEGAL_ARGUMENT, "Unkown hw index"},
+        CalibrationCase{"MissingFile", true, 7, false, EX_SERVICE_SPECIFIC,
+                        "Failed to load calibration"},
+        CalibrationCase{"Loaded", true, 7, true, EX_NONE, nullptr}),
+    [](const auto& info) { return std::string(info.param.name); });
+
+}  // namespace
+}  // namespace dalix
+}  // namespace hardware

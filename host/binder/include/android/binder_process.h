@@ -15,6 +15,10 @@ extern "C" {
 // Recorded only: the emulation never starts binder threads.
 bool ABinderProcess_setThreadPoolMaxThreadCount(uint32_t num_threads);
 
+// Does nothing: a client process of the emulation receives its callbacks
+// on the service thread, so there are no threads to start.
+void ABinderProcess_startThreadPool(void);
+
 // Gives the descriptor (an eventfd) that turns readable while commands wait
 // for ABinderProcess_handlePolledCommands. The calling thread becomes the
 // service thread: proxy calls made on it run directly.

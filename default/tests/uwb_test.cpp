@@ -38,7 +38,9 @@ class UwbTest : public ::testing::Test {
   void SetUp() override { ASSERT_TRUE(driver_.Start()); }
 
   void TearDown() override {
-    if (uwb_ != nullptr) EXPECT_TRUE(uwb_->close().isOk());
+    if (uwb_ != nullptr) {
+      EXPECT_TRUE(uwb_->close().isOk());
+    }
     uwb_.reset();
     service_.Stop();
   }
@@ -232,8 +234,12 @@ TEST_P(UwbCalibrationTest, LoadsIntoTheRadioOfTheIndex) {
   ndk::ScopedAStatus status = uwb_->loadCalibration(test.hw_index, path);
   unlink(path);
   EXPECT_EQ(status.getExceptionCode(), test.exception);
-  if (test.message != nullptr) EXPECT_STREQ(status.getMessage(), test.message);
-  if (test.exception == EX_SERVICE_SPECIFIC) EXPECT_EQ(status.getServiceSpecificError(), 0);
+  if (test.message != nullptr) {
+    EXPECT_STREQ(status.getMessage(), test.message);
+  }
+  if (test.exception == EX_SERVICE_SPECIFIC) {
+    EXPECT_EQ(status.getServiceSpecificError(), 0);
+  }
   const std::map<std::string, uint32_t> calibration = driver_.radios().Radio(7)->calibration;
   if (test.exception == EX_NONE) {
     EXPECT_EQ(calibration.at("xtal_trim"), 17u);

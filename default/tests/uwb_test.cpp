@@ -222,7 +222,9 @@ TEST_P(UwbCalibrationTest, LoadsIntoTheRadioOfTheIndex) {
   const CalibrationCase& test = GetParam();
   AddRadio(7, 0, "wpan0");
   StartService();
-  if (test.open) ASSERT_TRUE(uwb_->open(ndk::SharedRefBase::make<Client>()).isOk());
+  if (test.open) {
+    ASSERT_TRUE(uwb_->open(ndk::SharedRefBase::make<Client>()).isOk());
+  }
   char path[] = "/tmp/uwb_calibration_XXXXXX";
   const int fd = mkstemp(path);
   ASSERT_GE(fd, 0);

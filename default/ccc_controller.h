@@ -19,11 +19,11 @@ namespace dalix {
 // event-loop thread, which openCccSession blocks for the settle time.
 class CccController : public aidl::hardware::dalix::uwb::BnCccController {
  public:
-  // Every CCC failure reaches the client as this exception code. The
-  // controller calls it its illegal-state answer, but clients have always
-  // received the unsupported-operation code (-7) for it, not EX_ILLEGAL_STATE
-  // (-5), and they tell CCC failures apart by it.
-  static constexpr binder_exception_t kCccFailure = EX_UNSUPPORTED_OPERATION;
+  // The controller's "illegal state" answer, given for every failure of the
+  // driver or the interface. It is deliberately the unsupported-operation
+  // code (-7), not EX_ILLEGAL_STATE (-5): that is what CCC clients receive
+  // and tell CCC failures apart by.
+  static constexpr binder_exception_t kCccIllegalState = EX_UNSUPPORTED_OPERATION;
   // How long a freshly raised interface is given before a session is opened.
   static constexpr unsigned kInterfaceSettleMicros = 100000;
 

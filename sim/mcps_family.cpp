@@ -8,6 +8,7 @@
 #include <cstring>
 #include <optional>
 #include <string>
+#include <utility>
 #include <vector>
 
 #include <android-base/logging.h>
@@ -108,6 +109,10 @@ bool PutVerdict(nl_msg* reply, const std::string* refused_key, int32_t status) {
 McpsFamily::McpsFamily(RadioStore* radios)
     : radios_(radios), max_payload_(getpagesize() - NLMSG_HDRLEN) {}
 
+void McpsFamily::SetCommandHandler(uint8_t cmd, CommandHandler handler) {
+  command_handlers_[cmd] = std::move(handler);
+}
+
 void McpsFamily::HandleRequest(const Request& request, Responder& responder) {
   nlmsghdr* header = nlmsg_hdr(request.msg);
   if (static_cast<int>(nlmsg_datalen(header)) > max_payload_) {
@@ -131,6 +136,11 @@ void McpsFamily::HandleRequest(const Request& request, Responder& responder) {
       SetCalibrations(attrs, responder);
       return;
     default:
+      if (auto handler = command_handlers_.find(request.cmd);
+          handler != command_handlers_.end()) {
+        handler->second(request, attrs, responder);
+        return;
+      }
       LOG(WARNING) << "HandleRequest: unsupported command " << static_cast<int>(request.cmd);
       responder.Refuse(EOPNOTSUPP);
       return;

@@ -2,6 +2,8 @@
 
 #include <atomic>
 #include <cstdint>
+#include <functional>
+#include <map>
 
 #include "sim/family_handler.h"
 #include "sim/radio_store.h"
@@ -19,6 +21,12 @@ class McpsFamily : public FamilyHandler {
  public:
   explicit McpsFamily(RadioStore* radios);
 
+  // Serves one more command; |attrs| are the request's top-level attributes,
+  // already checked against the request policy. Set before the simulator
+  // starts.
+  using CommandHandler = std::function<void(const Request&, nlattr** attrs, Responder&)>;
+  void SetCommandHandler(uint8_t cmd, CommandHandler handler);
+
   void HandleRequest(const Request& request, Responder& responder) override;
 
   // Requests whose netlink payload exceeds |bytes| are refused with EMSGSIZE,
@@ -33,6 +41,7 @@ class McpsFamily : public FamilyHandler {
 
   RadioStore* radios_;
   std::atomic<int> max_payload_;
+  std::map<uint8_t, CommandHandler> command_handlers_;
 };
 
 }  // namespace sim

@@ -31,8 +31,8 @@ class CccRegionUtils {
   // caller's sake and not sent: the driver's start takes only the channel and
   // the fixed value, which is written to |*u32_param| and sent from there.
   // True when the driver replied, whatever its return code said.
-  virtual bool StartCccSession(uint32_t hw_index, uint32_t first, uint64_t timeref,
-                               uint8_t channel, uint32_t* u32_param);
+  virtual bool StartCccSession(uint32_t hw_index, uint32_t first, uint64_t timeref, uint8_t channel,
+                               uint32_t* u32_param);
 
   // Reads one test-mode reply. True when the return code reports success,
   // which the driver signals with a non-zero code; the session start does not

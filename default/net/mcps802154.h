@@ -8,6 +8,8 @@
 #include <stddef.h>
 #include <stdint.h>
 
+#include <climits>
+
 #include <array>
 
 #include <netlink/attr.h>
@@ -119,6 +121,26 @@ enum Mcps802154RangingResultAttr : int {
 };
 
 constexpr int kMcpsPdoaFractionalBits = 11;
+// The radio geometry that relates a phase difference to an angle of arrival:
+// angle = asin(phase difference * wavelength / (2 pi * antenna spacing)).
+constexpr float kMcpsCarrierWavelengthMetres = 0.046108086f;
+constexpr float kMcpsAntennaSpacingMetres = 0.0208f;
+// What a ranging report carries for a value the driver did not measure.
+constexpr int32_t kMcpsRangingValueAbsent = INT32_MIN;
+
+// Inside MCPS802154_ATTR_TESTDATA, request and reply.
+enum Kx7200TestModeAttr : int {
+  KX7200_TM_ATTR_UNSPEC = 0,
+  KX7200_TM_ATTR_CMD = 1,            // u32, one of Kx7200TestModeCommand
+  KX7200_TM_ATTR_CCC_U32_PARAM = 8,  // u32
+  KX7200_TM_ATTR_CCC_CHANNEL = 9,    // u8
+  KX7200_TM_ATTR_CCC_CMD_RC = 12,    // u8, reply only
+  KX7200_TM_ATTR_MAX = 12,
+};
+
+enum Kx7200TestModeCommand : uint32_t {
+  KX7200_TM_CMD_CCC_START_SESSION = 9,
+};
 
 // Scheduler and region names the driver knows.
 constexpr char kMcpsSchedulerDefault[] = "default";
@@ -141,6 +163,13 @@ constexpr nla_policy Policy(uint16_t type, uint16_t maxlen = 0) {
   nla_policy policy{};
   policy.type = type;
   policy.maxlen = maxlen;
+  return policy;
+}
+
+// An exact length for a type that libnl would read past a short attribute.
+constexpr nla_policy SignedPolicy(uint16_t type, uint16_t length) {
+  nla_policy policy = Policy(type, length);
+  policy.minlen = length;
   return policy;
 }
 
@@ -170,6 +199,39 @@ constexpr McpsPolicy<MCPS802154_RANGING_RESULT_ATTR_MAX> RangingResultPolicy() {
   McpsPolicy<MCPS802154_RANGING_RESULT_ATTR_MAX> policy{};
   policy[MCPS802154_RANGING_RESULT_ATTR_REQUEST_ID] = Policy(NLA_U32);
   policy[MCPS802154_RANGING_RESULT_ATTR_MEASUREMENT] = Policy(NLA_U32);
+  // Read as signed: libnl bounds no signed type by itself.
+  policy[MCPS802154_RANGING_RESULT_ATTR_PDOA_1] = SignedPolicy(NLA_S32, sizeof(int32_t));
+  policy[MCPS802154_RANGING_RESULT_ATTR_PDOA_2] = SignedPolicy(NLA_S32, sizeof(int32_t));
+  return policy;
+}
+
+constexpr McpsPolicy<MCPS802154_ATTR_MAX> TestModeReplyPolicy() {
+  McpsPolicy<MCPS802154_ATTR_MAX> policy{};
+  policy[MCPS802154_ATTR_TESTDATA] = Policy(NLA_NESTED);
+  return policy;
+}
+
+constexpr McpsPolicy<KX7200_TM_ATTR_MAX> TestDataReplyPolicy() {
+  McpsPolicy<KX7200_TM_ATTR_MAX> policy{};
+  policy[KX7200_TM_ATTR_CCC_CMD_RC] = Policy(NLA_U8);
+  return policy;
+}
+
+// What the driver accepts inside a test-mode request.
+constexpr McpsPolicy<KX7200_TM_ATTR_MAX> TestDataRequestPolicy() {
+  McpsPolicy<KX7200_TM_ATTR_MAX> policy{};
+  policy[KX7200_TM_ATTR_CMD] = Policy(NLA_U32, sizeof(uint32_t));
+  policy[KX7200_TM_ATTR_CCC_U32_PARAM] = Policy(NLA_U32, sizeof(uint32_t));
+  policy[KX7200_TM_ATTR_CCC_CHANNEL] = Policy(NLA_U8, sizeof(uint8_t));
+  return policy;
+}
+
+// What the driver accepts in one ranging request element.
+constexpr McpsPolicy<MCPS802154_RANGING_REQUEST_ATTR_MAX> RangingRequestPolicy() {
+  McpsPolicy<MCPS802154_RANGING_REQUEST_ATTR_MAX> policy{};
+  policy[MCPS802154_RANGING_REQUEST_ATTR_ID] = Policy(NLA_U32, sizeof(uint32_t));
+  policy[MCPS802154_RANGING_REQUEST_ATTR_PARAMETER] = Policy(NLA_U32, sizeof(uint32_t));
+  policy[MCPS802154_RANGING_REQUEST_ATTR_PEER] = Policy(NLA_U64, sizeof(uint64_t));
   return policy;
 }
 
@@ -221,6 +283,12 @@ inline constexpr McpsPolicy<MCPS802154_ATTR_MAX> kMcpsRangingReportPolicy =
 inline constexpr McpsPolicy<MCPS802154_RANGING_RESULT_ATTR_MAX> kMcpsRangingResultPolicy =
     mcps_internal::RangingResultPolicy();
 
+// Test-mode reply: top level, and inside MCPS802154_ATTR_TESTDATA.
+inline constexpr McpsPolicy<MCPS802154_ATTR_MAX> kMcpsTestModeReplyPolicy =
+    mcps_internal::TestModeReplyPolicy();
+inline constexpr McpsPolicy<KX7200_TM_ATTR_MAX> kMcpsTestDataReplyPolicy =
+    mcps_internal::TestDataReplyPolicy();
+
 // The driver's side: what it accepts in requests (top level, scheduler
 // parameters, one region, one calibration element).
 inline constexpr McpsPolicy<MCPS802154_ATTR_MAX> kMcpsRequestPolicy =
@@ -231,6 +299,10 @@ inline constexpr McpsPolicy<MCPS802154_REGION_ATTR_MAX> kMcpsRegionPolicy =
     mcps_internal::RegionPolicy();
 inline constexpr McpsPolicy<MCPS802154_CALIBRATION_ATTR_MAX> kMcpsCalibrationRequestPolicy =
     mcps_internal::CalibrationRequestPolicy();
+inline constexpr McpsPolicy<KX7200_TM_ATTR_MAX> kMcpsTestDataRequestPolicy =
+    mcps_internal::TestDataRequestPolicy();
+inline constexpr McpsPolicy<MCPS802154_RANGING_REQUEST_ATTR_MAX> kMcpsRangingRequestPolicy =
+    mcps_internal::RangingRequestPolicy();
 
 }  // namespace dalix
 }  // namespace hardware

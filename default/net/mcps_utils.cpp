@@ -7,6 +7,9 @@
 #include <string.h>
 #include <unistd.h>
 
+#include <algorithm>
+#include <cmath>
+#include <limits>
 #include <memory>
 
 #include <android-base/logging.h>
@@ -73,6 +76,25 @@ void OnCalibrationReply(nl_msg* msg, int* status) {
       *status = nla_get_s32(fields[MCPS802154_CALIBRATION_ATTR_STATUS]);
     }
   }
+}
+
+// A reported phase difference (radians, fixed point) as an angle of arrival:
+// asin(phase * wavelength / (2 pi * antenna spacing)). The steps and their
+// precisions are part of the result clients compare against: single
+// precision except for the division by 2 pi.
+float phase_to_rad(int32_t phase) {
+  constexpr float kFixedPointScale = 0.00048828125f;  // 2^-11
+  constexpr double kTwoPi = 6.283185307179586;
+  static_assert(kFixedPointScale == 1.0f / (1 << kMcpsPdoaFractionalBits));
+
+  // The absent-value marker, and anything else below the smallest phase.
+  if (phase < -32767) return std::numeric_limits<float>::quiet_NaN();
+  float x = static_cast<float>(phase) * kFixedPointScale;
+  x *= kMcpsCarrierWavelengthMetres;
+  x = static_cast<float>(static_cast<double>(x) / kTwoPi);
+  x /= kMcpsAntennaSpacingMetres;
+  x = std::clamp(x, -1.0f, 1.0f);
+  return asinf(x);
 }
 
 }  // namespace
@@ -270,18 +292,104 @@ bool McpsUtils::SetCalibration(uint32_t hw_index, ConfigUtils* config) {
   return !skipped && status == 0;
 }
 
-bool McpsUtils::SetRangingRequests(uint32_t /*hw_index*/,
-                                   const std::vector<RangingRequest>& /*requests*/) {
-  LOG(ERROR) << __func__ << ": simple ranging is not supported";
-  return false;
+bool McpsUtils::SetRangingRequests(uint32_t hw_index,
+                                   const std::vector<RangingRequest>& requests) {
+  LOG(INFO) << __func__;
+  if (!ranging_handler_) {
+    LOG(WARNING) << __func__ << ": The ranging result handler needs to be set first";
+    return false;
+  }
+  CloseRangingSocket();
+  ranging_requests_.clear();
+  if (requests.empty()) {
+    LOG(INFO) << __func__ << ": requests empty";
+    return true;
+  }
+  std::shared_ptr<NlSocket> socket = socket_factory_->Create();
+  if (!socket) return false;
+  UniqueNlMsg msg;
+  if (!RangingRequestsToNlMsg(msg.get(), hw_index, requests)) return false;
+  if (!socket->SendAndAwaitAck(msg.get(), nullptr)) return false;
+  // Reports come unasked, with sequence 0: nothing to acknowledge or match.
+  socket->DisableAutoAck();
+  if (!socket->WatchNetlinkSocket(socket, [this](nl_msg* report) {
+        return OnRangingResult(report);
+      })) {
+    return false;
+  }
+  ranging_socket_ = std::move(socket);
+  ranging_requests_ = requests;
+  return true;
 }
 
-void McpsUtils::SubscribeRangingResults(RangingResultHandler /*handler*/) {
-  LOG(ERROR) << __func__ << ": simple ranging is not supported";
+void McpsUtils::SubscribeRangingResults(RangingResultHandler handler) {
+  ranging_handler_ = std::move(handler);
 }
 
 void McpsUtils::UnsubscribeRangingResults() {
-  LOG(ERROR) << __func__ << ": simple ranging is not supported";
+  LOG(INFO) << __func__;
+  CloseRangingSocket();
+  std::vector<RangingRequest>().swap(ranging_requests_);
+  ranging_handler_ = nullptr;
+}
+
+void McpsUtils::CloseRangingSocket() {
+  if (!ranging_socket_) return;
+  LOG(INFO) << __func__ << ": Close ranging socket";
+  ranging_socket_.reset();
+}
+
+int McpsUtils::OnRangingResult(nl_msg* msg) {
+  LOG(INFO) << __func__;
+  nlmsghdr* header = nlmsg_hdr(msg);
+  // A message too short for the generic header cannot be a report.
+  int cmd = genlmsg_valid_hdr(header, 0) ? static_cast<int>(genlmsg_hdr(header)->cmd)
+                                         : static_cast<int>(MCPS802154_CMD_UNSPEC);
+  if (cmd != MCPS802154_CMD_RANGING_REPORT) {
+    LOG(WARNING) << __func__ << ": Incorrect command received: " << cmd;
+    return NL_STOP;
+  }
+  if (ranging_requests_.empty() || !ranging_handler_) return NL_STOP;
+
+  nlattr* attrs[MCPS802154_ATTR_MAX + 1] = {};
+  if (genlmsg_parse(header, 0, attrs, MCPS802154_ATTR_MAX,
+                    kMcpsRangingReportPolicy.data()) != 0) {
+    LOG(WARNING) << __func__ << ": Failed to parse attr";
+    return NL_STOP;
+  }
+  if (attrs[MCPS802154_ATTR_HW] == nullptr || attrs[MCPS802154_ATTR_RANGING_RESULT] == nullptr) {
+    LOG(WARNING) << __func__ << ": Missing HW or RANGING_RESULT";
+    return NL_STOP;
+  }
+  nlattr* fields[MCPS802154_RANGING_RESULT_ATTR_MAX + 1] = {};
+  if (nla_parse_nested(fields, MCPS802154_RANGING_RESULT_ATTR_MAX,
+                       attrs[MCPS802154_ATTR_RANGING_RESULT],
+                       kMcpsRangingResultPolicy.data()) != 0) {
+    LOG(WARNING) << __func__ << ": Failed to parse nested attr";
+    return NL_STOP;
+  }
+  if (fields[MCPS802154_RANGING_RESULT_ATTR_REQUEST_ID] == nullptr) return NL_STOP;
+  auto value_or_absent = [&fields](int id, bool is_signed) -> int32_t {
+    nlattr* attr = fields[id];
+    if (attr == nullptr) return kMcpsRangingValueAbsent;
+    return is_signed ? nla_get_s32(attr) : static_cast<int32_t>(nla_get_u32(attr));
+  };
+  const auto id =
+      static_cast<int32_t>(nla_get_u32(fields[MCPS802154_RANGING_RESULT_ATTR_REQUEST_ID]));
+  auto request = std::find_if(ranging_requests_.begin(), ranging_requests_.end(),
+                              [id](const RangingRequest& r) { return r.id == id; });
+  if (request == ranging_requests_.end()) {
+    LOG(WARNING) << __func__ << ": Received result for unknown request";
+    return NL_STOP;
+  }
+  RangingResult result;
+  result.id = id;
+  result.peerAddress = request->peerAddress;
+  result.measurement = value_or_absent(MCPS802154_RANGING_RESULT_ATTR_MEASUREMENT, false);
+  result.firstAngleRad = phase_to_rad(value_or_absent(MCPS802154_RANGING_RESULT_ATTR_PDOA_1, true));
+  result.secondAngleRad = phase_to_rad(value_or_absent(MCPS802154_RANGING_RESULT_ATTR_PDOA_2, true));
+  ranging_handler_(result);
+  return NL_STOP;
 }
 
 bool McpsUtils::SetMcpsCommand(nl_msg* msg, uint32_t hw_index, uint8_t cmd, int flags) {
@@ -295,10 +403,32 @@ bool McpsUtils::SetMcpsCommand(nl_msg* msg, uint32_t hw_index, uint8_t cmd, int 
   return true;
 }
 
-bool McpsUtils::RangingRequestsToNlMsg(nl_msg* /*msg*/, uint32_t /*hw_index*/,
-                                       const std::vector<RangingRequest>& /*requests*/) {
-  LOG(ERROR) << __func__ << ": simple ranging is not supported";
-  return false;
+bool McpsUtils::RangingRequestsToNlMsg(nl_msg* msg, uint32_t hw_index,
+                                       const std::vector<RangingRequest>& requests) {
+  if (!SetMcpsCommand(msg, hw_index, MCPS802154_CMD_SET_RANGING_REQUESTS, 0)) return false;
+  auto put_requests = [&]() {
+    nlattr* list = nla_nest_start(msg, MCPS802154_ATTR_RANGING_REQUESTS | NLA_F_NESTED);
+    if (list == nullptr) return false;
+    for (const RangingRequest& request : requests) {
+      nlattr* element =
+          nla_nest_start(msg, MCPS802154_RANGING_REQUESTS_ATTR_REQUEST | NLA_F_NESTED);
+      if (element == nullptr ||
+          nla_put_u32(msg, MCPS802154_RANGING_REQUEST_ATTR_ID, static_cast<uint32_t>(request.id)) ||
+          nla_put_u32(msg, MCPS802154_RANGING_REQUEST_ATTR_PARAMETER,
+                      static_cast<uint32_t>(request.parameter)) ||
+          nla_put_u64(msg, MCPS802154_RANGING_REQUEST_ATTR_PEER,
+                      static_cast<uint64_t>(request.peerAddress)) ||
+          nla_nest_end(msg, element)) {
+        return false;
+      }
+    }
+    return nla_nest_end(msg, list) == 0;
+  };
+  if (!put_requests()) {
+    LOG(ERROR) << __func__ << ": Error creating MCPS message";
+    return false;
+  }
+  return true;
 }
 
 bool McpsUtils::ParseHwInfo(nl_msg* msg, McpsHwInfo* info) {

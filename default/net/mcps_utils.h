@@ -3,6 +3,7 @@
 #include <stdint.h>
 
 #include <functional>
+#include <memory>
 #include <string>
 #include <vector>
 
@@ -75,15 +76,25 @@ class McpsUtils {
   // page each allows. False if any key was skipped or the driver refused one;
   // the others are still sent.
   virtual bool SetCalibration(uint32_t hw_index, ConfigUtils* config);
-  // Simple ranging: not available in this build yet; these report failure.
+  // Simple ranging. Installs |requests| on the radio and watches a socket of
+  // their own for the driver's reports; an empty list stops ranging without
+  // asking the driver. Needs a handler subscribed first.
   virtual bool SetRangingRequests(uint32_t hw_index, const std::vector<RangingRequest>& requests);
+  // Replaces the handler that receives every result, on the service thread.
   virtual void SubscribeRangingResults(RangingResultHandler handler);
+  // Stops the reports and forgets the requests and the handler.
   virtual void UnsubscribeRangingResults();
   // Writes the generic netlink header and the hardware index into an empty
   // message.
   virtual bool SetMcpsCommand(nl_msg* msg, uint32_t hw_index, uint8_t cmd, int flags);
   virtual bool RangingRequestsToNlMsg(nl_msg* msg, uint32_t hw_index,
                                       const std::vector<RangingRequest>& requests);
+
+  // Ends the report deliveries, if any: the watch holds the socket weakly.
+  void CloseRangingSocket();
+  // Receive callback of the ranging socket: turns one RANGING_REPORT into a
+  // result for the handler. Anything else is logged and dropped. NL_STOP.
+  int OnRangingResult(nl_msg* msg);
 
   // Reads one NEW_HW message. False when the index or the phy name is missing
   // (|info| untouched) or when the phy name carries no number after "phy"
@@ -97,6 +108,9 @@ class McpsUtils {
  private:
   NlSocketFactory* socket_factory_;
   uint32_t net_id_ = 0;
+  RangingResultHandler ranging_handler_;
+  std::shared_ptr<NlSocket> ranging_socket_;
+  std::vector<RangingRequest> ranging_requests_;
 };
 
 }  // namespace dalix

@@ -3,6 +3,7 @@
 #include <stdint.h>
 #include <stdio.h>
 
+#include <cmath>
 #include <deque>
 #include <map>
 #include <memory>
@@ -19,6 +20,8 @@
 
 #include "net/mcps802154.h"
 #include "net/unique_nl_msg.h"
+#include "sim/driver_simulator.h"
+#include "sim/simple_ranging_sim.h"
 #include "tests/log_capture.h"
 #include "tests/mock_nl_socket.h"
 #include "tests/sent_message.h"
@@ -29,10 +32,13 @@ namespace dalix {
 namespace {
 
 using ::android::base::ERROR;
+using ::android::base::INFO;
 using ::android::base::WARNING;
 using ::testing::_;
 using ::testing::AnyNumber;
 using ::testing::ByMove;
+using ::testing::DoAll;
+using ::testing::SaveArg;
 using ::testing::Return;
 using ::testing::StrEq;
 using ::testing::StrictMock;
@@ -81,8 +87,34 @@ class McpsUtilsTest : public ::testing::Test {
     });
   }
 
+  // Installs |requests| through a socket that records the request and keeps
+  // the handler that the watch is given; results are collected.
+  void Install(const std::vector<McpsUtils::RangingRequest>& requests) {
+    mcps_.SubscribeRangingResults([this](const auto& result) { results_.push_back(result); });
+    EXPECT_CALL(factory_, Create()).WillOnce([this] {
+      auto socket = std::make_unique<StrictMock<MockNlSocket>>();
+      EXPECT_CALL(*socket, SendAndAwaitAck(_, _)).WillOnce([this](nl_msg* msg, auto) {
+        sent_.emplace_back(msg);
+        return true;
+      });
+      EXPECT_CALL(*socket, DisableAutoAck());
+      EXPECT_CALL(*socket, WatchNetlinkSocket(_, _))
+          .WillOnce(DoAll(SaveArg<1>(&on_report_), Return(true)));
+      return std::unique_ptr<NlSocket>(std::move(socket));
+    });
+    ASSERT_TRUE(mcps_.SetRangingRequests(kHw, requests));
+  }
+
+  void Deliver(const sim::RangingReport& report, uint8_t cmd = MCPS802154_CMD_RANGING_REPORT) {
+    UniqueNlMsg msg = sim::DriverSimulator::NewEvent(kFamily, cmd);
+    ASSERT_TRUE(sim::SimpleRangingSim::EncodeRangingReport(msg.get(), kHw, report));
+    EXPECT_EQ(on_report_(msg.get()), NL_STOP);
+  }
+
   StrictMock<MockNlSocketFactory> factory_;
   McpsUtils mcps_{&factory_};
+  std::function<int(nl_msg*)> on_report_;
+  std::vector<McpsUtils::RangingResult> results_;
   std::vector<SentMessage> sent_;
   std::deque<UniqueNlMsg> replies_;
   ConfigUtils store_;
@@ -237,6 +269,87 @@ TEST_F(McpsUtilsTest, CalibrationOfANullStoreIsRefusedAndOfAnEmptyOneSendsNothin
   ExpectSocket(MCPS802154_CMD_SET_CALIBRATIONS);
   EXPECT_TRUE(mcps_.SetCalibration(kHw, &store_));
   EXPECT_TRUE(sent_.empty());
+}
+
+McpsUtils::RangingRequest Request(int32_t id, int32_t parameter, int64_t peer) {
+  McpsUtils::RangingRequest request;
+  request.id = id;
+  request.parameter = parameter;
+  request.peerAddress = peer;
+  return request;
+}
+
+// The angle of arrival straight from its definition, in double precision.
+double ExpectedAngle(std::optional<int32_t> phase) {
+  if (!phase || *phase < -32767) return NAN;
+  const double x = *phase / 2048.0 * 0.046108086 / (2 * M_PI * 0.0208);
+  return std::asin(std::fmax(-1.0, std::fmin(1.0, x)));
+}
+
+TEST_F(McpsUtilsTest, RequestsAreSentInOrderAndPhasesComeBackAsAngles) {
+  Install({Request(7, -2, 0x0102030405060708),
+           Request(9, 5, -1)});
+  ASSERT_EQ(sent_.size(), 1u);
+  EXPECT_EQ(sent_[0].cmd(), MCPS802154_CMD_SET_RANGING_REQUESTS);
+  std::vector<nlattr*> attrs = sent_[0].Attrs();
+  ASSERT_EQ(attrs.size(), 2u);
+  EXPECT_EQ(nla_get_u32(attrs[0]), kHw);
+  EXPECT_EQ(attrs[1]->nla_type, MCPS802154_ATTR_RANGING_REQUESTS | NLA_F_NESTED);
+  std::vector<std::vector<uint8_t>> fields;
+  for (nlattr* element : SentMessage::Children(attrs[1])) {
+    EXPECT_EQ(element->nla_type, MCPS802154_RANGING_REQUESTS_ATTR_REQUEST | NLA_F_NESTED);
+    for (nlattr* field : SentMessage::Children(element)) fields.push_back(SentMessage::Payload(field));
+  }
+  EXPECT_EQ(fields, (std::vector<std::vector<uint8_t>>{
+                        SentMessage::Bytes(7), SentMessage::Bytes(-2),
+                        SentMessage::Bytes(int64_t{0x0102030405060708}), SentMessage::Bytes(9),
+                        SentMessage::Bytes(5), SentMessage::Bytes(int64_t{-1})}));
+
+  const std::optional<int32_t> phases[] = {0,     1000,  -1000, 5805,         5806,
+                                           32767, -32767, -32768, std::nullopt};
+  for (std::optional<int32_t> phase : phases) {
+    SCOPED_TRACE(phase.value_or(0));
+    results_.clear();
+    std::optional<int32_t> half = phase ? std::optional<int32_t>(*phase / 2) : std::nullopt;
+    Deliver({9u, phase ? std::optional<uint32_t>(1234) : std::nullopt, phase, half});
+    ASSERT_EQ(results_.size(), 1u);
+    EXPECT_EQ(results_[0].peerAddress, -1);
+    EXPECT_EQ(results_[0].measurement, phase ? 1234 : INT32_MIN);
+    for (auto [angle, source] : {std::pair(results_[0].firstAngleRad, phase),
+                                 std::pair(results_[0].secondAngleRad, half)}) {
+      const double expected = ExpectedAngle(source);
+      if (std::isnan(expected)) {
+        EXPECT_TRUE(std::isnan(angle));
+      } else {
+        EXPECT_NEAR(angle, expected, 2e-6);
+      }
+    }
+  }
+}
+
+TEST_F(McpsUtilsTest, ReportsReachTheFirstRequestOfTheirIdOnly) {
+  Install({Request(1, 0, 10),
+           Request(1, 0, 11),
+           Request(2, 0, 12)});
+  Deliver({1u, 5u, 0, 0});
+  Deliver({8u, 5u, 0, 0});
+  Deliver({1u, 5u, 0, 0}, MCPS802154_CMD_NEW_HW);
+  Deliver({std::nullopt, 5u, 0, 0});
+  ASSERT_EQ(results_.size(), 1u);
+  EXPECT_EQ(results_[0].peerAddress, 10);
+  EXPECT_EQ(log_.Count(WARNING, "OnRangingResult: Received result for unknown request", kTag), 1);
+  EXPECT_EQ(log_.Count(WARNING, "OnRangingResult: Incorrect command received: 2", kTag), 1);
+}
+
+TEST_F(McpsUtilsTest, AnEmptyListStopsRangingWithoutTheDriver) {
+  EXPECT_FALSE(mcps_.SetRangingRequests(kHw, {}));
+  EXPECT_TRUE(log_.Contains(
+      WARNING, "SetRangingRequests: The ranging result handler needs to be set first", kTag));
+  Install({Request(1, 0, 10)});
+  EXPECT_TRUE(mcps_.SetRangingRequests(kHw, {}));
+  EXPECT_TRUE(log_.Contains(INFO, "CloseRangingSocket: Close ranging socket", kTag));
+  Deliver({1u, 5u, 0, 0});
+  EXPECT_TRUE(results_.empty());
 }
 
 }  // namespace

@@ -16,6 +16,7 @@ namespace dalix {
 class MockNlSocket : public NlSocket {
  public:
   MockNlSocket() : NlSocket(nullptr) {}
+  MOCK_METHOD(void, DisableAutoAck, (), (override));
   MOCK_METHOD(int, Resolve, (const char* family), (override));
   MOCK_METHOD(bool, ReceiveMessage, (std::function<int(nl_msg*)> handler), (override));
   MOCK_METHOD(bool, SendAndAwaitAck, (nl_msg * msg, std::function<int(nl_msg*)> on_message),

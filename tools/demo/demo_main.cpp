@@ -185,7 +185,7 @@ std::string Screen(const DemoSite& site, const tools::RangingClient& client, con
            "UWB HAL demo: FiRa on %s, simple ranging on %s, %.0f s (Ctrl-C to stop)\n\n",
            DemoSite::kFiraRadio, DemoSite::kSimpleRangingRadio, elapsed_s);
   std::string text = header + RenderTable(rows) + "\n" +
-                     RenderMap(rows, site.RadioPositions(), site.HalfWidth(), kMapColumns,
+                     RenderMap(rows, site.RadioPositions(), site.MapCentre(), site.HalfWidth(), kMapColumns,
                                kMapLines);
   for (const std::string& line : log.Lines()) text += line + "\n";
   return text;
@@ -246,11 +246,20 @@ int Run(const DemoOptions& options) {
     fira.controlees = site.ShortAddresses();
     tools::SimpleRangingOptions simple;
     simple.peers = site.ExtendedAddresses();
-    if (!client.Open(&error) || !client.ListRadios(&radios, &error) ||
-        !client.StartFira(DemoSite::kFiraRadio, fira, &error) ||
-        !client.StartSimpleRanging(DemoSite::kSimpleRangingRadio, simple, &error)) {
+    if (!client.Open(&error) || !client.ListRadios(&radios, &error)) {
       fprintf(stderr, "demo: %s\n", error.c_str());
       status = 1;
+    }
+    // One mode failing still shows the other.
+    if (status == 0 && !client.StartFira(DemoSite::kFiraRadio, fira, &error)) {
+      fprintf(stderr, "demo: FiRa on %s: %s\n", DemoSite::kFiraRadio, error.c_str());
+      error.clear();
+    }
+    if (status == 0 &&
+        !client.StartSimpleRanging(DemoSite::kSimpleRangingRadio, simple, &error)) {
+      fprintf(stderr, "demo: simple ranging on %s: %s\n", DemoSite::kSimpleRangingRadio,
+              error.c_str());
+      error.clear();
     }
 
     struct sigaction action = {};

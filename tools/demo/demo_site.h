@@ -39,7 +39,8 @@ class DemoSite {
   // Where |reading| puts the peer on the site's map.
   std::optional<Point> MeasuredPosition(const tools::PeerReading& reading) const;
   std::vector<Point> RadioPositions() const;
-  // Half the width of the map that holds every track.
+  // The middle of the map and half its width: the area the peers walk.
+  Point MapCentre() const;
   double HalfWidth() const;
   // The largest distance error that the simulated noise and the encoding's
   // resolution allow.

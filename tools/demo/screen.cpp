@@ -3,7 +3,6 @@
 #include <math.h>
 #include <stdio.h>
 
-#include <algorithm>
 #include <cctype>
 
 namespace hardware {
@@ -68,19 +67,19 @@ std::string RenderTable(const std::vector<PeerRow>& rows) {
 }
 
 std::string RenderMap(const std::vector<PeerRow>& rows, const std::vector<Point>& radios,
-                      double half_width_m, int columns, int lines) {
+                      const Point& centre, double half_width_m, int columns, int lines) {
   std::vector<std::string> grid(lines, std::string(columns, ' '));
   // A character cell is about twice as tall as it is wide.
   const double half_height_m = half_width_m * lines * 2.0 / columns;
   auto plot = [&](const Point& point, char mark, bool over) {
-    const int column = static_cast<int>(lround((point.x / half_width_m + 1) * (columns - 1) / 2));
-    const int row = static_cast<int>(lround((1 - point.y / half_height_m) * (lines - 1) / 2));
+    const double x = (point.x - centre.x) / half_width_m;
+    const double y = (point.y - centre.y) / half_height_m;
+    const int column = static_cast<int>(lround((x + 1) * (columns - 1) / 2));
+    const int row = static_cast<int>(lround((1 - y) * (lines - 1) / 2));
     if (column < 0 || column >= columns || row < 0 || row >= lines) return;
     char& cell = grid[row][column];
     if (over || cell == ' ' || cell == '.') cell = mark;
   };
-  for (int row = 0; row < lines; ++row) grid[row][columns / 2] = '.';
-  std::fill(grid[lines / 2].begin(), grid[lines / 2].end(), '.');
   for (const PeerRow& row : rows) {
     if (row.truth) plot(row.truth->position, static_cast<char>(tolower(row.mark)), false);
   }

@@ -39,8 +39,9 @@ struct PeerRow {
 // measured (capital letters) against true (small letters), radios as '#'.
 // Pure functions of their input, so any thread may call them.
 std::string RenderTable(const std::vector<PeerRow>& rows);
+// |centre| is the point in the middle of the map.
 std::string RenderMap(const std::vector<PeerRow>& rows, const std::vector<Point>& radios,
-                      double half_width_m, int columns, int lines);
+                      const Point& centre, double half_width_m, int columns, int lines);
 
 }  // namespace demo
 }  // namespace dalix

@@ -44,8 +44,7 @@ Motion Motion::Line(const Vector3& start, const Vector3& direction, double speed
   return motion;
 }
 
-Motion Motion::Circle(const Vector3& centre, double radius_m, double speed_mps,
-                      double phase_rad) {
+Motion Motion::Circle(const Vector3& centre, double radius_m, double speed_mps, double phase_rad) {
   Motion motion;
   motion.kind = Kind::kCircle;
   motion.origin = centre;

@@ -117,8 +117,7 @@ class World {
 
   // The exact view of |short_address| from |hw_index| at |time_s|; nullopt
   // for an unknown peer.
-  std::optional<Observation> Truth(uint32_t hw_index, uint16_t short_address,
-                                   double time_s) const;
+  std::optional<Observation> Truth(uint32_t hw_index, uint16_t short_address, double time_s) const;
   // Truth() with the configured noise: what a radio would measure.
   std::optional<Observation> Measure(uint32_t hw_index, uint16_t short_address, double time_s);
 

@@ -105,8 +105,7 @@ class FiraRegionUtils {
   bool StartCallMessage(nl_msg* msg, uint32_t hw_index, uint8_t call, nlattr** region_nest,
                         nlattr** params_nest);
   bool EndCallMessage(nl_msg* msg, nlattr* region_nest, nlattr* params_nest);
-  bool CreateSessionStateMsg(nl_msg* msg, uint32_t hw_index, uint8_t call,
-                             uint32_t session_id);
+  bool CreateSessionStateMsg(nl_msg* msg, uint32_t hw_index, uint8_t call, uint32_t session_id);
   // InitSession, StopSession and DeinitSession on a one-shot socket.
   bool SendSessionState(uint32_t hw_index, uint8_t call, uint32_t session_id);
   bool SendControlees(const char* caller, uint32_t hw_index, uint8_t call, uint32_t session_id,

@@ -21,6 +21,7 @@
 #include <android/binder_manager.h>
 
 #include "service_main.h"
+#include "uwb.h"
 #include "sim/private_namespace.h"
 #include "sim/service_thread.h"
 #include "tools/demo/demo_options.h"
@@ -62,6 +63,10 @@ class LogTail {
     std::lock_guard<std::mutex> lock(mutex_);
     lines_.push_back(std::string(tag != nullptr ? tag : "") + ": " + message);
     if (lines_.size() > kLogLinesShown) lines_.pop_front();
+  }
+  void Clear() {
+    std::lock_guard<std::mutex> lock(mutex_);
+    lines_.clear();
   }
   std::deque<std::string> Lines() const {
     std::lock_guard<std::mutex> lock(mutex_);
@@ -250,6 +255,14 @@ int Run(const DemoOptions& options) {
       fprintf(stderr, "demo: %s\n", error.c_str());
       status = 1;
     }
+    // A workstation has no vendor partition: the service says so at open,
+    // and the demo says it once instead of showing those lines.
+    if (access(Uwb::kCalibrationFile, R_OK) != 0 || access(Uwb::kHalPropertiesFile, R_OK) != 0) {
+      Say(options, std::string("service: no ") + Uwb::kCalibrationFile + " or " +
+                       Uwb::kHalPropertiesFile +
+                       " here: the radios run uncalibrated, with default antenna properties");
+    }
+    log_tail.Clear();
     // One mode failing still shows the other.
     if (status == 0 && !client.StartFira(DemoSite::kFiraRadio, fira, &error)) {
       fprintf(stderr, "demo: FiRa on %s: %s\n", DemoSite::kFiraRadio, error.c_str());

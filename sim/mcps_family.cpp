@@ -17,6 +17,7 @@
 
 #include "net/mcps802154.h"
 #include "net/unique_nl_msg.h"
+#include "sim/fira_region_sim.h"
 
 namespace hardware {
 namespace dalix {
@@ -59,8 +60,8 @@ int ReadSchedulerRequest(nlattr** attrs, SchedulerRequest* out) {
     nla_for_each_nested(region, regions, remaining) {
       if (nla_type(region) != MCPS802154_SCHEDULER_REGIONS_ATTR_REGION) return EINVAL;
       nlattr* fields[MCPS802154_REGION_ATTR_MAX + 1] = {};
-      if (nla_parse_nested(fields, MCPS802154_REGION_ATTR_MAX, region,
-                           kMcpsRegionPolicy.data()) != 0 ||
+      if (nla_parse_nested(fields, MCPS802154_REGION_ATTR_MAX, region, kMcpsRegionPolicy.data()) !=
+              0 ||
           fields[MCPS802154_REGION_ATTR_NAME] == nullptr) {
         return EINVAL;
       }
@@ -134,6 +135,14 @@ void McpsFamily::HandleRequest(const Request& request, Responder& responder) {
       return;
     case MCPS802154_CMD_SET_CALIBRATIONS:
       SetCalibrations(attrs, responder);
+      return;
+    case MCPS802154_CMD_CALL_REGION:
+      // Only the FiRa region is simulated.
+      if (fira_ != nullptr) {
+        fira_->HandleCall(request, attrs, responder);
+      } else {
+        responder.Refuse(EOPNOTSUPP);
+      }
       return;
     default:
       if (auto handler = command_handlers_.find(request.cmd);
@@ -215,6 +224,11 @@ void McpsFamily::SetScheduler(const Request& request, nlattr** attrs, Responder&
   }
   if (!radios_->SetScheduler(hw_index, wanted.name, slot_duration, node_type, regions)) {
     responder.Refuse(ENODEV);  // removed meanwhile
+    return;
+  }
+  // A new scheduler brings new regions: the old sessions are gone.
+  if (request.cmd == MCPS802154_CMD_SET_SCHEDULER && fira_ != nullptr) {
+    fira_->DropSessions(hw_index);
   }
 }
 

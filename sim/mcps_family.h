@@ -13,6 +13,8 @@ namespace hardware {
 namespace dalix {
 namespace sim {
 
+class FiraRegionSim;
+
 // The simulated UWB MAC driver's "mcps802154" family: radio discovery,
 // scheduler and region selection, and calibration, served from a RadioStore.
 // Requests are checked as strictly as the driver checks them. Runs on the
@@ -33,6 +35,9 @@ class McpsFamily : public FamilyHandler {
   // as the kernel refuses a message larger than a page. Defaults to a page
   // less the netlink header.
   void SetMaxPayload(int bytes) { max_payload_ = bytes; }
+  // Serves region calls with |fira| (borrowed); without it they are
+  // refused. Attach before the simulator starts.
+  void AttachFiraRegion(FiraRegionSim* fira) { fira_ = fira; }
 
  private:
   void GetHw(const Request& request, nlattr** attrs, Responder& responder);
@@ -42,6 +47,7 @@ class McpsFamily : public FamilyHandler {
   RadioStore* radios_;
   std::atomic<int> max_payload_;
   std::map<uint8_t, CommandHandler> command_handlers_;
+  FiraRegionSim* fira_ = nullptr;
 };
 
 }  // namespace sim

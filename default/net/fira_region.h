@@ -101,6 +101,37 @@ enum FiraSessionParamAttr : int {
   FIRA_SESSION_PARAM_ATTR_MAX = 47,
 };
 
+// Width in bytes of a fixed-size session parameter: 1, 2 or 4; 0 for the
+// static STS key (raw bytes) and for ids that are not parameters.
+constexpr int FiraSessionParamWidth(int attr) {
+  switch (attr) {
+    case FIRA_SESSION_PARAM_ATTR_SHORT_ADDR:
+    case FIRA_SESSION_PARAM_ATTR_DESTINATION_SHORT_ADDR:
+      return 2;
+    case FIRA_SESSION_PARAM_ATTR_INITIATION_TIME_MS:
+    case FIRA_SESSION_PARAM_ATTR_SLOT_DURATION_RSTU:
+    case FIRA_SESSION_PARAM_ATTR_RANGING_BLOCK_DURATION_MS:
+    case FIRA_SESSION_PARAM_ATTR_SLOTS_PER_RANGING_ROUND:
+    case FIRA_SESSION_PARAM_ATTR_BLOCK_STRIDING_VALUE:
+    case FIRA_SESSION_PARAM_ATTR_MAX_RANGING_ROUND_RETRIES:
+    case FIRA_SESSION_PARAM_ATTR_IN_BAND_TERMINATION_ATTEMPT_COUNT:
+    case FIRA_SESSION_PARAM_ATTR_SUB_SESSION_ID:
+      return 4;
+    case FIRA_SESSION_PARAM_ATTR_UNSPEC:
+    case 31:
+    case FIRA_SESSION_PARAM_ATTR_STATIC_STS_KEY:
+    case 39:
+    case 40:
+      return 0;
+    default:
+      return attr > 0 && attr <= FIRA_SESSION_PARAM_ATTR_MAX ? 1 : 0;
+  }
+}
+
+// The static STS key: a 6-byte IV followed by a 2-byte vendor id. The driver
+// takes at most this much.
+inline constexpr uint16_t kFiraStaticStsKeyMaxLen = 16;
+
 // FIRA_CALL_ATTR_CONTROLEES holds one nest per controlee, typed by its
 // 1-based position in the list, each holding these.
 enum FiraCallControleeAttr : int {
@@ -257,6 +288,33 @@ constexpr McpsPolicy<FIRA_AOA_ATTR_MAX> AoaPolicy() {
   return policy;
 }
 
+constexpr McpsPolicy<FIRA_CALL_ATTR_MAX> CallPolicy() {
+  McpsPolicy<FIRA_CALL_ATTR_MAX> policy{};
+  policy[FIRA_CALL_ATTR_SESSION_ID] = Exact(NLA_U32, sizeof(uint32_t));
+  policy[FIRA_CALL_ATTR_SESSION_PARAMS] = Of(NLA_NESTED);
+  policy[FIRA_CALL_ATTR_CONTROLEES] = Of(NLA_NESTED);
+  return policy;
+}
+
+constexpr McpsPolicy<FIRA_SESSION_PARAM_ATTR_MAX> SessionParamsPolicy() {
+  McpsPolicy<FIRA_SESSION_PARAM_ATTR_MAX> policy{};
+  for (int id = 1; id <= FIRA_SESSION_PARAM_ATTR_MAX; ++id) {
+    const int width = FiraSessionParamWidth(id);
+    if (width == 1) policy[id] = Exact(NLA_U8, 1);
+    if (width == 2) policy[id] = Exact(NLA_U16, 2);
+    if (width == 4) policy[id] = Exact(NLA_U32, 4);
+  }
+  policy[FIRA_SESSION_PARAM_ATTR_STATIC_STS_KEY] = Of(NLA_BINARY, kFiraStaticStsKeyMaxLen);
+  return policy;
+}
+
+constexpr McpsPolicy<FIRA_CALL_CONTROLEE_ATTR_MAX> ControleePolicy() {
+  McpsPolicy<FIRA_CALL_CONTROLEE_ATTR_MAX> policy{};
+  policy[FIRA_CALL_CONTROLEE_ATTR_SHORT_ADDR] = Exact(NLA_U16, sizeof(uint16_t));
+  policy[FIRA_CALL_CONTROLEE_ATTR_SUB_SESSION_ID] = Exact(NLA_U32, sizeof(uint32_t));
+  return policy;
+}
+
 }  // namespace fira_internal
 
 // A received region call, top level: the hardware index and the call nest.
@@ -273,6 +331,14 @@ inline constexpr McpsPolicy<FIRA_RANGING_DATA_ATTR_MAX> kFiraRangingDataPolicy =
 inline constexpr McpsPolicy<FIRA_MEASUREMENT_ATTR_MAX> kFiraMeasurementPolicy =
     fira_internal::MeasurementPolicy();
 inline constexpr McpsPolicy<FIRA_AOA_ATTR_MAX> kFiraAoaPolicy = fira_internal::AoaPolicy();
+
+// The driver's side: what it accepts inside a FiRa region call's parameters,
+// the session parameters and one controlee entry.
+inline constexpr McpsPolicy<FIRA_CALL_ATTR_MAX> kFiraCallPolicy = fira_internal::CallPolicy();
+inline constexpr McpsPolicy<FIRA_SESSION_PARAM_ATTR_MAX> kFiraSessionParamsPolicy =
+    fira_internal::SessionParamsPolicy();
+inline constexpr McpsPolicy<FIRA_CALL_CONTROLEE_ATTR_MAX> kFiraControleePolicy =
+    fira_internal::ControleePolicy();
 
 }  // namespace dalix
 }  // namespace hardware

@@ -14,19 +14,12 @@
 #include <android/binder_process.h>
 #include <netlink/msg.h>
 
+#include "binder_polling.h"
 #include "net/ccc_region_utils.h"
 #include "net/fira_region_utils.h"
 #include "net/ieee_utils.h"
 #include "net/mcps_utils.h"
 #include "uwb.h"
-
-// Vendor code cannot count on the polling calls: they are not part of the
-// binder library's vendor interface, so they are taken weakly and checked
-// before use.
-extern "C" {
-binder_status_t ABinderProcess_setupPolling(int* fd) __attribute__((weak));
-binder_status_t ABinderProcess_handlePolledCommands(void) __attribute__((weak));
-}
 
 namespace hardware {
 namespace dalix {
@@ -40,16 +33,11 @@ void InitLogger() {
   // wants; this stays as the one place to change that.
 }
 
-bool BinderPollingResolved() {
-  return ABinderProcess_setupPolling != nullptr &&
-         ABinderProcess_handlePolledCommands != nullptr;
-}
-
 int SetupBinderOrCrash() {
   // No binder threads: every transaction is drained by the event loop, on
   // the one thread the service has.
   ABinderProcess_setThreadPoolMaxThreadCount(0);
-  CHECK(BinderPollingResolved())
+  CHECK(BinderPollingAvailable())
       << "Binder polling is not available to this process: ABinderProcess_setupPolling or "
          "ABinderProcess_handlePolledCommands did not resolve";
   int binder_fd = -1;

@@ -3,16 +3,19 @@
 
   aidl_gen.py outputs  --out DIR FILE.aidl...   list the files `generate` writes
   aidl_gen.py generate --out DIR --api-dir DIR --version N FILE.aidl...
-  aidl_gen.py hash     DIR                     print the hash of a frozen version
-  aidl_gen.py freeze   --src DIR --api-dir DIR --version N
+  aidl_gen.py hash     --version N DIR         print the hash of frozen version N in DIR
+  aidl_gen.py freeze   --api-dir DIR --version N FILE.aidl...
 
 `generate` takes the interface hash from the frozen version N under
 --api-dir and refuses to run when that version's .hash file disagrees.
+`freeze` writes the API dump of the sources as version N and as `current`,
+with the .hash of version N.
 Errors are printed as `file:line: reason` and end the program with status 1.
 """
 
 import argparse
 import os
+import shutil
 import sys
 from typing import List
 
@@ -53,7 +56,7 @@ def frozen_hash(api_dir: str, version: int) -> str:
     frozen = os.path.join(api_dir, str(version))
     if not os.path.isdir(frozen):
         raise GenerateError('%s: frozen version %d is missing' % (frozen, version))
-    computed = api_dump.api_hash(frozen)
+    computed = api_dump.api_hash(frozen, version)
     hash_path = os.path.join(frozen, '.hash')
     recorded = api_dump.read_hash_file(hash_path)
     if recorded != computed:
@@ -75,20 +78,26 @@ def command_generate(args):
 
 
 def command_hash(args):
-    print(api_dump.api_hash(args.dir))
+    print(api_dump.api_hash(args.dir, args.version))
 
 
 def command_freeze(args):
-    contents = api_dump.frozen_contents(args.src)
+    frozen = os.path.join(args.api_dir, str(args.version))
+    if os.path.exists(frozen):
+        raise GenerateError('%s: version %d is frozen already' % (frozen, args.version))
+    if args.version > 1 and not os.path.isdir(os.path.join(args.api_dir, str(args.version - 1))):
+        raise GenerateError('%s: version %d must follow a frozen version %d'
+                            % (frozen, args.version, args.version - 1))
+    contents = api_dump.frozen_contents(parse_package(args.files))
     for target in (str(args.version), 'current'):
+        shutil.rmtree(os.path.join(args.api_dir, target), ignore_errors=True)
         for relative, data in contents:
             path = os.path.join(args.api_dir, target, relative)
             os.makedirs(os.path.dirname(path), exist_ok=True)
             with open(path, 'wb') as output:
                 output.write(data)
-    frozen = os.path.join(args.api_dir, str(args.version))
     with open(os.path.join(frozen, '.hash'), 'w', encoding='ascii') as hash_file:
-        hash_file.write(api_dump.api_hash(frozen) + '\n')
+        hash_file.write(api_dump.api_hash(frozen, args.version) + '\n')
 
 
 def main(argv: List[str]) -> int:
@@ -105,12 +114,13 @@ def main(argv: List[str]) -> int:
     generate.add_argument('files', nargs='+')
     generate.set_defaults(run=command_generate)
     hash_parser = commands.add_parser('hash')
+    hash_parser.add_argument('--version', type=int, required=True)
     hash_parser.add_argument('dir')
     hash_parser.set_defaults(run=command_hash)
     freeze = commands.add_parser('freeze')
-    freeze.add_argument('--src', required=True)
     freeze.add_argument('--api-dir', required=True)
     freeze.add_argument('--version', type=int, required=True)
+    freeze.add_argument('files', nargs='+')
     freeze.set_defaults(run=command_freeze)
     args = parser.parse_args(argv)
     try:

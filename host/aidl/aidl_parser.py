@@ -6,6 +6,10 @@ interface -- annotated @VintfStability. Fields and parameters take the
 primitive types, String, declared types, T[] and List<T>, optionally
 @nullable; parameters may be `in` or `out`. Anything else is refused with an
 AidlError naming the file, the line and the reason.
+
+Name resolution follows the platform compiler: a type of the package is
+found through its `import` line or its fully qualified name, never merely
+because it sits in the same directory.
 """
 
 import dataclasses
@@ -14,6 +18,8 @@ import re
 from typing import Dict, List, Optional, Tuple
 
 PRIMITIVES = ('boolean', 'byte', 'int', 'long', 'float', 'double')
+# Types that the platform compiler refuses for the NDK back end.
+NDK_REFUSED = ('Map', 'CharSequence', 'FileDescriptor')
 KEYWORDS = ('package', 'import', 'parcelable', 'interface', 'enum', 'in', 'out',
             'inout', 'oneway', 'void', 'const', 'union')
 # Names the generated C++ cannot use as identifiers.
@@ -48,6 +54,7 @@ class Annotation:
 class TypeRef:
     name: str                      # primitive, 'String', 'List' or a declared name
     line: int
+    qualified: bool = False        # written with its package
     element: Optional['TypeRef'] = None   # the T of List<T>
     is_array: bool = False
     nullable: bool = False
@@ -67,6 +74,7 @@ class Param:
     type: TypeRef
     name: str
     line: int
+    written_direction: str = ''    # as the source has it, '' when left out
 
 
 @dataclasses.dataclass
@@ -87,7 +95,11 @@ class Declaration:
     fields: List[Field] = dataclasses.field(default_factory=list)
     methods: List[Method] = dataclasses.field(default_factory=list)
     enumerators: List[Tuple[str, int]] = dataclasses.field(default_factory=list)
+    # The value of each enumerator as the source spells it.
+    enumerator_texts: List[str] = dataclasses.field(default_factory=list)
     backing: str = ''
+    # Imported type name -> line of its import.
+    imports: Dict[str, int] = dataclasses.field(default_factory=dict)
 
     @property
     def qualified_name(self) -> str:
@@ -169,6 +181,7 @@ class _Parser:
         self.take('package')
         package = self.take(kind='name')
         self.take(';')
+        imports = {}
         while self.peek()[1] == 'import':
             line = self.line()
             self.take('import')
@@ -176,6 +189,10 @@ class _Parser:
             self.take(';')
             if imported.rpartition('.')[0] != package:
                 self.fail('imports from other packages are not supported: %s' % imported, line)
+            if imported.rpartition('.')[2] in imports:
+                self.fail('import %s is duplicated' % imported, line)
+            imports[imported.rpartition('.')[2]] = line
+        self.package = package
         annotations = self.annotations()
         line = self.line()
         keyword = self.peek()[1]
@@ -192,6 +209,7 @@ class _Parser:
         if self.peek()[0] != 'end':
             self.fail('only one declaration per file is supported')
         self.apply_declaration_annotations(decl, annotations)
+        decl.imports = imports
         return decl
 
     def annotations(self) -> List[Annotation]:
@@ -234,12 +252,16 @@ class _Parser:
         name = self.take(kind='name')
         if name in ('void', 'in', 'out', 'inout', 'oneway'):
             self.fail('expected a type but found "%s"' % name, line)
-        if name in ('char', 'IBinder', 'FileDescriptor', 'ParcelFileDescriptor', 'Map',
-                    'CharSequence', 'ParcelableHolder'):
+        if name in NDK_REFUSED:
+            self.fail('type %s is not supported by the NDK back end' % name, line)
+        if name in ('char', 'IBinder', 'ParcelFileDescriptor', 'ParcelableHolder'):
             self.fail('type %s is not supported' % name, line)
-        if '.' in name:
-            self.fail('qualified type names are not supported: %s' % name, line)
-        ref = TypeRef(name, line)
+        qualified = '.' in name
+        if qualified:
+            package, _, name = name.rpartition('.')
+            if package != self.package:
+                self.fail("Failed to resolve '%s.%s'" % (package, name), line)
+        ref = TypeRef(name, line, qualified=qualified)
         if self.accept('<'):
             if name != 'List':
                 self.fail('only List<T> may take a type argument', line)
@@ -267,9 +289,10 @@ class _Parser:
         while not self.accept('}'):
             value_line = self.line()
             name = self.identifier('enumerator')
+            text = None
             if self.accept('='):
-                literal = self.take(kind='number')
-                next_value = int(literal, 0)
+                text = self.take(kind='number')
+                next_value = int(text, 0)
             if not -128 <= next_value <= 127:
                 self.fail('value %d of %s does not fit the byte backing' % (next_value, name),
                           value_line)
@@ -278,6 +301,7 @@ class _Parser:
             if any(next_value == v for _, v in decl.enumerators):
                 self.fail('enumerators with the same value are not supported', value_line)
             decl.enumerators.append((name, next_value))
+            decl.enumerator_texts.append(str(next_value) if text is None else text)
             next_value += 1
             if not self.accept(','):
                 self.take('}')
@@ -342,11 +366,9 @@ class _Parser:
         direction = ''
         if self.peek()[1] in ('in', 'out', 'inout'):
             direction = self.take()
-            if direction == 'inout':
-                self.fail('inout parameters are not supported', line)
         param_type = self.type_ref()
         name = self.identifier('parameter')
-        return Param(direction, param_type, name, line)
+        return Param(direction, param_type, name, line, written_direction=direction)
 
 
 def parse_file(path: str) -> Declaration:
@@ -382,8 +404,9 @@ class Resolver:
         if ref.name in ('String', 'List'):
             return ref.name
         target = self.decls.get(ref.name)
-        if target is None:
-            raise AidlError(decl.path, ref.line, 'unknown type %s' % ref.name)
+        visible = ref.qualified or ref.name == decl.name or ref.name in decl.imports
+        if target is None or not visible:
+            raise AidlError(decl.path, ref.line, "Failed to resolve '%s'" % ref.name)
         return target.kind
 
     def check_type(self, decl: Declaration, ref: TypeRef, in_parcelable: bool):
@@ -409,6 +432,10 @@ class Resolver:
 
     def check(self) -> List[Declaration]:
         for decl in self.decls.values():
+            for name, line in decl.imports.items():
+                if name not in self.decls:
+                    raise AidlError(decl.path, line, "Couldn't find import for class %s.%s"
+                                    % (decl.package, name))
             for field in decl.fields:
                 self.check_type(decl, field.type, in_parcelable=True)
                 if field.type.kind == 'parcelable' and field.type.name == decl.name \
@@ -417,7 +444,12 @@ class Resolver:
             for method in decl.methods:
                 if method.return_type is not None:
                     self.check_type(decl, method.return_type, in_parcelable=False)
+                names = set()
                 for param in method.params:
+                    if param.name in names:
+                        raise AidlError(decl.path, param.line, "method '%s' has duplicate "
+                                        "argument name '%s'" % (method.name, param.name))
+                    names.add(param.name)
                     self.check_type(decl, param.type, in_parcelable=False)
                     self.check_direction(decl, param)
         return list(self.decls.values())
@@ -425,6 +457,11 @@ class Resolver:
     @staticmethod
     def check_direction(decl: Declaration, param: Param):
         carries_data = param.type.is_array or param.type.kind in ('List', 'parcelable')
+        if param.direction == 'inout':
+            if not carries_data:
+                raise AidlError(decl.path, param.line, "'%s %s' can be an in parameter only"
+                                % (param.type.name, param.name))
+            raise AidlError(decl.path, param.line, 'inout parameters are not supported')
         if carries_data and not param.direction:
             raise AidlError(decl.path, param.line,
                             '%s %s can be an out type, so it needs "in" or "out"'

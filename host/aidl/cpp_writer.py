@@ -342,8 +342,7 @@ class CppWriter:
             '#include <binder_host/host.h>', '']
         lines += self.open_namespace()
         lines += ['',
-                  'const char* %s::descriptor = "%s";' % (name, decl.qualified_name),
-                  'const int32_t %s::version;' % name, '',
+                  'const char* %s::descriptor = "%s";' % (name, decl.qualified_name), '',
                   '%s::%s() = default;' % (name, name),
                   '%s::~%s() = default;' % (name, name), '',
                   'std::shared_ptr<%s> %s::fromBinder(const ::ndk::SpAIBinder& binder) {'

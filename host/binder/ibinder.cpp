@@ -1,4 +1,10 @@
+#define LOG_TAG "libbinder_ndk"
+
 #include <android/binder_ibinder.h>
+
+#include <stdlib.h>
+
+#include <android-base/logging.h>
 
 #include <binder_host/host.h>
 
@@ -11,6 +17,15 @@ struct AIBinder_Weak {
 };
 
 namespace ndk {
+namespace internal {
+
+void AbortNotMade(const char* what) {
+  LOG(FATAL) << "SharedRefBase: an object not created by SharedRefBase::make() was " << what;
+  abort();
+}
+
+}  // namespace internal
+
 namespace host {
 namespace internal {
 

@@ -72,7 +72,10 @@ binder_exception_t AServiceManager_addService(AIBinder* binder, const char* inst
 
 AIBinder* AServiceManager_checkService(const char* instance) {
   if (instance == nullptr) return nullptr;
-  return ServiceRegistry::Get().Find(instance).release();
+  const ndk::SpAIBinder found = ServiceRegistry::Get().Find(instance);
+  // The caller's reference, beside the one |found| drops.
+  if (found.get() != nullptr) AIBinder_incStrong(found.get());
+  return found.get();
 }
 
 AIBinder* AServiceManager_getService(const char* instance) {

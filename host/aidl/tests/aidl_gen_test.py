@@ -37,6 +37,12 @@ class GeneratorTest(unittest.TestCase):
             out.write(HEAD + '@VintfStability\n' + text)
         return path
 
+    def write_raw(self, name, text):
+        path = os.path.join(self.dir, name + '.aidl')
+        with open(path, 'w') as out:
+            out.write(text)
+        return path
+
     def test_unsupported_constructs_name_file_line_and_reason(self):
         cases = [
             ('IOneway', 'interface IOneway {\n    oneway void f();\n}\n', 4,
@@ -44,13 +50,28 @@ class GeneratorTest(unittest.TestCase):
             ('Big', '@Backing(type="byte")\nenum Big {\n    A = 127,\n    B,\n}\n', 6,
              'does not fit the byte backing'),
             ('Holder', 'parcelable Holder {\n\n    Map<String, String> m;\n}\n', 5,
-             'type Map is not supported'),
+             'type Map is not supported by the NDK back end'),
+            ('Unimported', 'parcelable Unimported {\n    Other o;\n}\n', 4,
+             "Failed to resolve 'Other'"),
+            ('Unknown', 'parcelable Unknown {\n    aidl.hardware.dalix.uwb.Nowhere n;\n}\n', 4,
+             "Failed to resolve 'Nowhere'"),
+            ('Foreign', 'parcelable Foreign {\n    android.os.Thing t;\n}\n', 4,
+             "Failed to resolve 'android.os.Thing'"),
+            ('IInout', 'interface IInout {\n    void f(inout int x);\n}\n', 4,
+             "'int x' can be an in parameter only"),
+            ('ITwice', 'interface ITwice {\n    void f(int x, long x);\n}\n', 4,
+             "method 'f' has duplicate argument name 'x'"),
+            ('IGone', 'interface IGone {\n    void f(CharSequence s);\n}\n', 4,
+             'type CharSequence is not supported by the NDK back end'),
+            ('Doubled', 'parcelable Doubled {\n    int a;\n    int a;\n}\n', 5,
+             'field a is declared twice'),
         ]
         for name, text, line, reason in cases:
             with self.subTest(name):
                 path = self.write(name, text)
+                other = self.write('Other', 'parcelable Other {\n    int x;\n}\n')
                 with self.assertRaises(AidlError) as caught:
-                    parse_package([path])
+                    parse_package([path, other])
                 self.assertTrue(str(caught.exception).startswith('%s:%d: ' % (path, line)),
                                 str(caught.exception))
                 self.assertIn(reason, caught.exception.reason)
@@ -60,6 +81,24 @@ class GeneratorTest(unittest.TestCase):
         self.assertEqual((1, ''), (run.returncode, run.stdout))
         self.assertEqual('aidl_gen: error: %s:4: nested "union" declarations are not supported\n'
                          % os.path.join(self.dir, 'IBad.aidl'), run.stderr)
+
+    def test_imports_must_name_types_of_the_package(self):
+        other = self.write('Other', 'parcelable Other {\n    int x;\n}\n')
+        cases = [
+            ('import aidl.hardware.dalix.uwb.Missing;\n', 2,
+             "Couldn't find import for class aidl.hardware.dalix.uwb.Missing"),
+            ('import aidl.hardware.dalix.uwb.Other;\nimport aidl.hardware.dalix.uwb.Other;\n', 3,
+             'import aidl.hardware.dalix.uwb.Other is duplicated'),
+        ]
+        for imports, line, reason in cases:
+            with self.subTest(reason):
+                path = self.write_raw('User', HEAD + imports +
+                                      '@VintfStability\nparcelable User {\n    Other o;\n}\n')
+                with self.assertRaises(AidlError) as caught:
+                    parse_package([path, other])
+                self.assertEqual((path, line, reason),
+                                 (caught.exception.path, caught.exception.line,
+                                  caught.exception.reason))
 
     def test_output_is_deterministic_and_listed_in_advance(self):
         second = os.path.join(self.dir, 'second')
@@ -85,25 +124,64 @@ class GeneratorTest(unittest.TestCase):
             aidl_gen.frozen_hash(api, 1)
 
 
+def hash_recipe(frozen, previous):
+    """The platform build's own shell recipe for the hash of a frozen version."""
+    recipe = ('(cd "$0" && find ./ -name "*.aidl" -print0 | LC_ALL=C sort -z | '
+              'xargs -0 sha1sum && echo "$1") | sha1sum')
+    run = subprocess.run(['sh', '-c', recipe, frozen, previous], capture_output=True, text=True,
+                         check=True)
+    return run.stdout.split()[0]
+
+
+def read_tree(root):
+    tree = {}
+    for relative in api_dump.aidl_files(root):
+        with open(os.path.join(root, relative), 'rb') as frozen:
+            tree[relative] = frozen.read()
+    return tree
+
+
 class FrozenApiTest(unittest.TestCase):
-    def test_frozen_copies_hold_the_sources_and_the_hash_is_the_recipe(self):
-        expected = dict(api_dump.frozen_contents(AIDL_ROOT))
+    def setUp(self):
+        self.sources = sorted(glob.glob(os.path.join(PACKAGE_DIR, '*.aidl')))
+
+    def test_frozen_dumps_are_the_sources_dump_and_the_hash_is_the_recipe(self):
+        expected = dict(api_dump.frozen_contents(parse_package(self.sources)))
         self.assertEqual(34, len(expected))
         for version in ('1', 'current'):
-            root = os.path.join(API_DIR, version)
-            self.assertEqual(sorted(expected), api_dump.aidl_files(root), version)
-            for relative, data in expected.items():
-                with open(os.path.join(root, relative), 'rb') as frozen:
-                    self.assertEqual(data, frozen.read(), relative)
+            self.assertEqual(expected, read_tree(os.path.join(API_DIR, version)), version)
         frozen = os.path.join(API_DIR, '1')
-        computed = api_dump.api_hash(frozen)
+        computed = api_dump.api_hash(frozen, 1)
         self.assertEqual(api_dump.read_hash_file(os.path.join(frozen, '.hash')), computed)
-        if shutil.which('sha1sum') is not None:
-            recipe = ('(cd "$0" && find ./ -name "*.aidl" -print0 | LC_ALL=C sort -z | '
-                      'xargs -0 sha1sum && echo latest-version) | sha1sum')
-            run = subprocess.run(['sh', '-c', recipe, frozen], capture_output=True, text=True,
-                                 check=True)
-            self.assertEqual(run.stdout.split()[0], computed)
+        self.assertEqual(hash_recipe(frozen, 'latest-version'), computed)
+
+    def test_a_dump_reads_back_as_the_same_declarations(self):
+        # Every type in a dump is fully qualified and no file imports anything.
+        frozen = os.path.join(API_DIR, '1')
+        paths = [os.path.join(frozen, p) for p in api_dump.aidl_files(frozen)]
+        self.assertEqual(read_tree(frozen),
+                         dict(api_dump.frozen_contents(parse_package(paths))))
+
+    def test_a_later_version_hashes_with_the_version_before_it(self):
+        work = tempfile.mkdtemp()
+        self.addCleanup(shutil.rmtree, work)
+        api = os.path.join(work, 'aidl_api')
+        shutil.copytree(API_DIR, api)
+        freeze = [sys.executable, '-B', GENERATOR, 'freeze', '--api-dir', api]
+        subprocess.run(freeze + ['--version', '2'] + self.sources, check=True)
+        version2 = os.path.join(api, '2')
+        self.assertEqual(read_tree(os.path.join(API_DIR, '1')), read_tree(version2))
+        recorded = api_dump.read_hash_file(os.path.join(version2, '.hash'))
+        self.assertEqual(hash_recipe(version2, '1'), recorded)
+        self.assertNotEqual(api_dump.read_hash_file(os.path.join(API_DIR, '1', '.hash')),
+                            recorded)
+        self.assertEqual(recorded, aidl_gen.frozen_hash(api, 2))
+        for version in ('2', '4'):
+            with self.subTest(version):
+                run = subprocess.run(freeze + ['--version', version] + self.sources,
+                                     capture_output=True, text=True)
+                self.assertEqual(1, run.returncode)
+                self.assertIn('frozen already' if version == '2' else 'must follow', run.stderr)
 
 
 if __name__ == '__main__':

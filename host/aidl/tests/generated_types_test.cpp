@@ -131,7 +131,7 @@ TEST(GeneratedTypesTest, FullSessionPrintsEveryFieldInOrder) {
 template <typename Interface>
 void ExpectIdentity(const char* name, const std::string& hash) {
   EXPECT_EQ(std::string("aidl.hardware.dalix.uwb.") + name, Interface::descriptor);
-  EXPECT_EQ(1, Interface::version) << name;
+  static_assert(Interface::version == 1);
   EXPECT_EQ(hash, Interface::hash) << name;
 }
 

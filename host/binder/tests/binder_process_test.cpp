@@ -191,3 +191,23 @@ TEST_F(BinderProcessTest, BinderKeepsItsObjectAndALivingObjectKeepsItsBinder) {
 }
 
 }  // namespace
+
+namespace {
+
+// make() is the only owner the device tolerates; anything else aborts here
+// at the first ref() or at destruction instead of being owned twice there.
+TEST(SharedRefBaseDeathTest, ObjectsNotMadeByMakeAbort) {
+  GTEST_FLAG_SET(death_test_style, "threadsafe");
+  EXPECT_DEATH(std::make_shared<Thing>(), "not created by SharedRefBase::make\\(\\) was destroyed");
+  EXPECT_DEATH({ Thing on_stack; }, "was destroyed");
+  EXPECT_DEATH(
+      {
+        auto shared = std::make_shared<Thing>();
+        (void)shared->asBinder();
+      },
+      "was asked for ref\\(\\)");
+  auto made = ndk::SharedRefBase::make<Thing>();
+  EXPECT_EQ(made, made->ref<Thing>());
+}
+
+}  // namespace

@@ -3,7 +3,9 @@
 
 #include <cerrno>
 #include <cstdint>
+#include <functional>
 #include <string>
+#include <utility>
 
 #include <gtest/gtest.h>
 
@@ -18,6 +20,8 @@ static_assert(EX_ILLEGAL_ARGUMENT == -3 && EX_ILLEGAL_STATE == -5 &&
 static_assert(STATUS_UNKNOWN_ERROR == INT32_MIN && STATUS_FAILED_TRANSACTION == INT32_MIN + 2 &&
               STATUS_DEAD_OBJECT == -EPIPE);
 
+// The descriptions are the platform's own texts, which clients and bug
+// reports show.
 TEST(StatusTest, EachConstructorReportsItsPartsAndDescription) {
   const struct {
     ScopedAStatus status;
@@ -35,15 +39,19 @@ TEST(StatusTest, EachConstructorReportsItsPartsAndDescription) {
       {ScopedAStatus::fromExceptionCodeWithMessage(EX_UNSUPPORTED_OPERATION, nullptr),
        EX_UNSUPPORTED_OPERATION, 0, STATUS_OK, "", "Status(-7, EX_UNSUPPORTED_OPERATION): ''"},
       {ScopedAStatus::fromExceptionCode(EX_TRANSACTION_FAILED), EX_TRANSACTION_FAILED, 0,
-       STATUS_FAILED_TRANSACTION, "", "Status(-129, EX_TRANSACTION_FAILED): '-2147483646: '"},
+       STATUS_FAILED_TRANSACTION, "", "Status(-129, EX_TRANSACTION_FAILED): 'FAILED_TRANSACTION: '"},
+      {ScopedAStatus::fromExceptionCodeWithMessage(-128, "x"), -128, 0, STATUS_OK, "x",
+       "Status(-128, EX_HAS_REPLY_HEADER): 'x'"},
+      {ScopedAStatus::fromExceptionCode(-42), -42, 0, STATUS_OK, "", "Status(-42, -42): ''"},
+      {ScopedAStatus::fromStatus(-EIO), EX_TRANSACTION_FAILED, 0, -EIO, "",
+       "Status(-129, EX_TRANSACTION_FAILED): '-5 (Input/output error): '"},
       {ScopedAStatus::fromServiceSpecificErrorWithMessage(1, "Netlink failure"),
        EX_SERVICE_SPECIFIC, 1, STATUS_OK, "Netlink failure",
        "Status(-8, EX_SERVICE_SPECIFIC): '1: Netlink failure'"},
       {ScopedAStatus::fromServiceSpecificError(-7), EX_SERVICE_SPECIFIC, -7, STATUS_OK, "",
        "Status(-8, EX_SERVICE_SPECIFIC): '-7: '"},
       {ScopedAStatus::fromStatus(STATUS_DEAD_OBJECT), EX_TRANSACTION_FAILED, 0,
-       STATUS_DEAD_OBJECT, "", "Status(-129, EX_TRANSACTION_FAILED): '-32: '"},
-      {ScopedAStatus(), EX_TRANSACTION_FAILED, 0, STATUS_UNEXPECTED_NULL, "", ""},
+       STATUS_DEAD_OBJECT, "", "Status(-129, EX_TRANSACTION_FAILED): 'DEAD_OBJECT: '"},
   };
   for (const auto& c : cases) {
     SCOPED_TRACE(c.description);
@@ -52,9 +60,28 @@ TEST(StatusTest, EachConstructorReportsItsPartsAndDescription) {
     EXPECT_EQ(c.service_specific, c.status.getServiceSpecificError());
     EXPECT_EQ(c.transport, c.status.getStatus());
     EXPECT_EQ(c.message, c.status.getMessage());
-    if (c.status.get() != nullptr) {
-      EXPECT_EQ(c.description, c.status.getDescription());
-    }
+    EXPECT_EQ(c.description, c.status.getDescription());
+  }
+}
+
+// An empty status is not OK, and any other reading of it is a bug that
+// crashes on the device; here it aborts with a line naming the reader.
+TEST(StatusDeathTest, ReadingAnEmptyStatusAborts) {
+  GTEST_FLAG_SET(death_test_style, "threadsafe");
+  ScopedAStatus held = ScopedAStatus::fromServiceSpecificError(1);
+  ScopedAStatus taken = std::move(held);
+  EXPECT_FALSE(held.isOk());  // NOLINT(bugprone-use-after-move): the point of the test
+  EXPECT_EQ(1, taken.getServiceSpecificError());
+  const std::function<void(const ScopedAStatus&)> readers[] = {
+      [](const ScopedAStatus& s) { (void)s.getExceptionCode(); },
+      [](const ScopedAStatus& s) { (void)s.getServiceSpecificError(); },
+      [](const ScopedAStatus& s) { (void)s.getStatus(); },
+      [](const ScopedAStatus& s) { (void)s.getMessage(); },
+      [](const ScopedAStatus& s) { (void)s.getDescription(); },
+  };
+  for (const auto& read : readers) {
+    EXPECT_DEATH(read(held), "AStatus_get[A-Za-z]*: the status is empty");
+    EXPECT_DEATH(read(ScopedAStatus()), "the status is empty");
   }
 }
 

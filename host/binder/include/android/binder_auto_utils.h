@@ -1,7 +1,10 @@
 #pragma once
 
 // Owning C++ wrappers around the binder C objects of the host emulation,
-// with the platform's names and member functions.
+// with the platform's names and member functions, and none beyond those
+// that both supported platform releases offer: no release() (ownership of
+// a binder object never leaves its wrapper), promote() callable on a
+// mutable weak reference only.
 
 #include <android/binder_ibinder.h>
 #include <android/binder_status.h>
@@ -24,9 +27,10 @@ class ScopedAResource {
 
   ScopedAResource(const ScopedAResource&) = delete;
   ScopedAResource& operator=(const ScopedAResource&) = delete;
-  ScopedAResource(ScopedAResource&& other) noexcept : resource_(other.release()) {}
+  ScopedAResource(ScopedAResource&& other) noexcept
+      : resource_(std::exchange(other.resource_, kDefault)) {}
   ScopedAResource& operator=(ScopedAResource&& other) noexcept {
-    if (this != &other) set(other.release());
+    if (this != &other) set(std::exchange(other.resource_, kDefault));
     return *this;
   }
 
@@ -39,11 +43,6 @@ class ScopedAResource {
   T get() const { return resource_; }
   // Out-parameter access for C calls that fill the resource in.
   T* getR() { return &resource_; }
-  T release() {
-    T held = resource_;
-    resource_ = kDefault;
-    return held;
-  }
 
  private:
   T resource_;
@@ -62,7 +61,7 @@ class SpAIBinder {
   SpAIBinder(const SpAIBinder& other) : binder_(other.binder_) {
     if (binder_ != nullptr) AIBinder_incStrong(binder_);
   }
-  SpAIBinder(SpAIBinder&& other) noexcept : binder_(other.release()) {}
+  SpAIBinder(SpAIBinder&& other) noexcept : binder_(std::exchange(other.binder_, nullptr)) {}
   ~SpAIBinder() { set(nullptr); }
 
   SpAIBinder& operator=(const SpAIBinder& other) {
@@ -71,7 +70,7 @@ class SpAIBinder {
     return *this;
   }
   SpAIBinder& operator=(SpAIBinder&& other) noexcept {
-    if (this != &other) set(other.release());
+    if (this != &other) set(std::exchange(other.binder_, nullptr));
     return *this;
   }
 
@@ -82,11 +81,6 @@ class SpAIBinder {
     if (old != nullptr) AIBinder_decStrong(old);
   }
   AIBinder* get() const { return binder_; }
-  AIBinder* release() {
-    AIBinder* held = binder_;
-    binder_ = nullptr;
-    return held;
-  }
   AIBinder** getR() { return &binder_; }
 
   bool operator==(const SpAIBinder& other) const { return binder_ == other.binder_; }
@@ -97,7 +91,7 @@ class SpAIBinder {
   AIBinder* binder_ = nullptr;
 };
 
-class ScopedAIBinder_Weak
+class [[nodiscard]] ScopedAIBinder_Weak
     : public impl::ScopedAResource<AIBinder_Weak*, AIBinder_Weak_delete, nullptr> {
  public:
   explicit ScopedAIBinder_Weak(AIBinder_Weak* weak = nullptr) : ScopedAResource(weak) {}
@@ -105,10 +99,10 @@ class ScopedAIBinder_Weak
   ScopedAIBinder_Weak& operator=(ScopedAIBinder_Weak&&) = default;
 
   // Null once the binder's last strong reference is gone.
-  SpAIBinder promote() const { return SpAIBinder(AIBinder_Weak_promote(get())); }
+  SpAIBinder promote() { return SpAIBinder(AIBinder_Weak_promote(get())); }
 };
 
-class ScopedAIBinder_DeathRecipient
+class [[nodiscard]] ScopedAIBinder_DeathRecipient
     : public impl::ScopedAResource<AIBinder_DeathRecipient*, AIBinder_DeathRecipient_delete,
                                    nullptr> {
  public:
@@ -118,10 +112,10 @@ class ScopedAIBinder_DeathRecipient
   ScopedAIBinder_DeathRecipient& operator=(ScopedAIBinder_DeathRecipient&&) = default;
 };
 
-// The status that every interface operation returns. An empty object (as
-// left by a move) is not OK, and reads as a failed transaction carrying
-// STATUS_UNEXPECTED_NULL.
-class ScopedAStatus : public impl::ScopedAResource<AStatus*, AStatus_delete, nullptr> {
+// The status that every interface operation returns; dropping one unread
+// is a warning, as on the platform. An empty object (as left by a move) is
+// not OK, and reading any other part of it aborts.
+class [[nodiscard]] ScopedAStatus : public impl::ScopedAResource<AStatus*, AStatus_delete, nullptr> {
  public:
   explicit ScopedAStatus(AStatus* status = nullptr) : ScopedAResource(status) {}
   ScopedAStatus(ScopedAStatus&&) = default;

@@ -16,8 +16,10 @@ extern "C" {
 #endif
 
 typedef uint32_t transaction_code_t;
-#define FIRST_CALL_TRANSACTION 0x00000001
-#define LAST_CALL_TRANSACTION 0x00ffffff
+enum {
+  FIRST_CALL_TRANSACTION = 0x00000001,
+  LAST_CALL_TRANSACTION = 0x00ffffff,
+};
 
 // Reference counted: AIBinder_incStrong / AIBinder_decStrong, or
 // ndk::SpAIBinder. Counting is thread-safe.
@@ -43,10 +45,10 @@ binder_status_t AIBinder_dump(AIBinder* binder, int fd, const char** args, uint3
 struct AIBinder_Weak;
 typedef struct AIBinder_Weak AIBinder_Weak;
 
-AIBinder_Weak* AIBinder_Weak_new(AIBinder* binder);
+BINDER_HOST_MUST_USE_RESULT AIBinder_Weak* AIBinder_Weak_new(AIBinder* binder);
 void AIBinder_Weak_delete(AIBinder_Weak* weak_binder);
 // A new strong reference, or null once the last strong reference is gone.
-AIBinder* AIBinder_Weak_promote(AIBinder_Weak* weak_binder);
+BINDER_HOST_MUST_USE_RESULT AIBinder* AIBinder_Weak_promote(AIBinder_Weak* weak_binder);
 
 // Death notifications. The callback runs on the thread that handles polled
 // commands, once per link, unless the link is removed first.
@@ -54,7 +56,8 @@ typedef void (*AIBinder_DeathRecipient_onBinderDied)(void* cookie);
 struct AIBinder_DeathRecipient;
 typedef struct AIBinder_DeathRecipient AIBinder_DeathRecipient;
 
-AIBinder_DeathRecipient* AIBinder_DeathRecipient_new(AIBinder_DeathRecipient_onBinderDied on_died);
+BINDER_HOST_MUST_USE_RESULT AIBinder_DeathRecipient* AIBinder_DeathRecipient_new(
+    AIBinder_DeathRecipient_onBinderDied on_died);
 // Also removes every link made with the recipient, including a notification
 // that is queued but not yet delivered.
 void AIBinder_DeathRecipient_delete(AIBinder_DeathRecipient* recipient);

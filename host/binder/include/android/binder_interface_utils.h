@@ -7,40 +7,58 @@
 #include <android/binder_auto_utils.h>
 #include <android/binder_ibinder.h>
 
+#include <cstddef>
 #include <memory>
 #include <mutex>
 #include <utility>
 
 namespace ndk {
 
+namespace internal {
+// Aborts with a line that names what happened to an object that
+// SharedRefBase::make() did not create.
+[[noreturn]] void AbortNotMade(const char* what);
+}  // namespace internal
+
 // An object owned through std::shared_ptr that can hand out further owners
-// of itself. Create it with make(); ref() on an object made otherwise gives
-// null.
+// of itself. The only way to create one is make(): `new`, std::make_unique
+// and the like do not compile (operator new is private, as on the device),
+// and an object that make() did not create -- on the stack, a member, or
+// from std::make_shared -- aborts when it is destroyed or asked for ref(),
+// where the device would own it twice.
 class SharedRefBase {
  public:
   SharedRefBase() = default;
-  virtual ~SharedRefBase() = default;
+  virtual ~SharedRefBase() {
+    if (!made_) internal::AbortNotMade("destroyed");
+  }
   SharedRefBase(const SharedRefBase&) = delete;
   SharedRefBase& operator=(const SharedRefBase&) = delete;
 
-  template <typename T>
-  std::shared_ptr<T> ref() {
-    return std::static_pointer_cast<T>(this_.lock());
+  std::shared_ptr<SharedRefBase> ref() {
+    if (!made_) internal::AbortNotMade("asked for ref()");
+    return this_.lock();
   }
-  template <typename T>
-  std::shared_ptr<const T> ref() const {
-    return std::static_pointer_cast<const T>(this_.lock());
+  template <typename CHILD>
+  std::shared_ptr<CHILD> ref() {
+    return std::static_pointer_cast<CHILD>(ref());
   }
 
   template <typename T, typename... Args>
   static std::shared_ptr<T> make(Args&&... args) {
     std::shared_ptr<T> object(new T(std::forward<Args>(args)...));
     object->SharedRefBase::this_ = object;
+    object->SharedRefBase::made_ = true;
     return object;
   }
 
+  static void operator delete(void* pointer) { ::operator delete(pointer); }
+
  private:
+  static void* operator new(size_t size) { return ::operator new(size); }
+
   std::weak_ptr<SharedRefBase> this_;
+  bool made_ = false;
 };
 
 class ICInterface;
@@ -70,7 +88,7 @@ class ICInterface : public SharedRefBase {
 template <typename INTERFACE>
 class BnCInterface : public INTERFACE {
  public:
-  SpAIBinder asBinder() override {
+  SpAIBinder asBinder() final {
     std::lock_guard<std::mutex> lock(binder_mutex_);
     SpAIBinder binder = weak_binder_.promote();
     if (binder.get() == nullptr && weak_binder_.get() != nullptr) {
@@ -82,7 +100,7 @@ class BnCInterface : public INTERFACE {
     }
     return binder;
   }
-  bool isRemote() override { return false; }
+  bool isRemote() final { return false; }
 
  protected:
   virtual SpAIBinder createBinder() = 0;
@@ -97,8 +115,8 @@ template <typename INTERFACE>
 class BpCInterface : public INTERFACE {
  public:
   explicit BpCInterface(const SpAIBinder& binder) : binder_(binder) {}
-  SpAIBinder asBinder() override { return binder_; }
-  bool isRemote() override { return AIBinder_isRemote(binder_.get()); }
+  SpAIBinder asBinder() final { return binder_; }
+  bool isRemote() final { return AIBinder_isRemote(binder_.get()); }
 
  private:
   SpAIBinder binder_;

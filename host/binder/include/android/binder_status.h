@@ -8,6 +8,16 @@
 #include <stdbool.h>
 #include <stdint.h>
 
+// The platform marks the results below that must not be dropped with
+// __attribute__((warn_unused_result)). The host says the same with the
+// standard attribute, which lets a (void) cast mark a result as dropped on
+// purpose under every compiler, as the platform's compiler allows.
+#ifdef __cplusplus
+#define BINDER_HOST_MUST_USE_RESULT [[nodiscard]]
+#else
+#define BINDER_HOST_MUST_USE_RESULT __attribute__((warn_unused_result))
+#endif
+
 #ifdef __cplusplus
 extern "C" {
 #endif
@@ -49,7 +59,6 @@ enum {
   EX_UNSUPPORTED_OPERATION = -7,
   EX_SERVICE_SPECIFIC = -8,
   EX_PARCELABLE = -9,
-  EX_HAS_REPLY_HEADER = -128,
   EX_TRANSACTION_FAILED = -129,
 };
 typedef int32_t binder_exception_t;
@@ -60,17 +69,20 @@ typedef int32_t binder_exception_t;
 struct AStatus;
 typedef struct AStatus AStatus;
 
-AStatus* AStatus_newOk(void);
+BINDER_HOST_MUST_USE_RESULT AStatus* AStatus_newOk(void);
 // EX_NONE gives an OK status; EX_TRANSACTION_FAILED carries
 // STATUS_FAILED_TRANSACTION; EX_SERVICE_SPECIFIC carries the error 0.
-AStatus* AStatus_fromExceptionCode(binder_exception_t exception);
-AStatus* AStatus_fromExceptionCodeWithMessage(binder_exception_t exception, const char* message);
-AStatus* AStatus_fromServiceSpecificError(int32_t service_specific);
-AStatus* AStatus_fromServiceSpecificErrorWithMessage(int32_t service_specific,
-                                                     const char* message);
+BINDER_HOST_MUST_USE_RESULT AStatus* AStatus_fromExceptionCode(binder_exception_t exception);
+BINDER_HOST_MUST_USE_RESULT AStatus* AStatus_fromExceptionCodeWithMessage(
+    binder_exception_t exception, const char* message);
+BINDER_HOST_MUST_USE_RESULT AStatus* AStatus_fromServiceSpecificError(int32_t service_specific);
+BINDER_HOST_MUST_USE_RESULT AStatus* AStatus_fromServiceSpecificErrorWithMessage(
+    int32_t service_specific, const char* message);
 // STATUS_OK gives an OK status; anything else is EX_TRANSACTION_FAILED.
-AStatus* AStatus_fromStatus(binder_status_t status);
+BINDER_HOST_MUST_USE_RESULT AStatus* AStatus_fromStatus(binder_status_t status);
 
+// The readers below take a status that exists: a null status aborts, as
+// it crashes on the device.
 bool AStatus_isOk(const AStatus* status);
 binder_exception_t AStatus_getExceptionCode(const AStatus* status);
 // 0 unless the exception is EX_SERVICE_SPECIFIC.
@@ -80,8 +92,11 @@ binder_status_t AStatus_getStatus(const AStatus* status);
 // Never null; empty when the status carries no message. Valid while the
 // status lives.
 const char* AStatus_getMessage(const AStatus* status);
-// A readable summary; release it with AStatus_deleteDescription.
-const char* AStatus_getDescription(const AStatus* status);
+// The platform's summary: "No error", or "Status(<code>, <name>): '" then
+// "<error>: " for a service-specific error, "<STATUS name>: " for a failed
+// transaction, then the message and "'". Release it with
+// AStatus_deleteDescription.
+BINDER_HOST_MUST_USE_RESULT const char* AStatus_getDescription(const AStatus* status);
 void AStatus_deleteDescription(const char* description);
 void AStatus_delete(AStatus* status);
 

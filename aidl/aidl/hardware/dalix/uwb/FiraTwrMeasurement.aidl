@@ -1,5 +1,8 @@
 package aidl.hardware.dalix.uwb;
 
+import aidl.hardware.dalix.uwb.FiraAntennaMeasurement;
+import aidl.hardware.dalix.uwb.UwbAddress;
+
 // The result for one peer. Field order is the service's own.
 @VintfStability
 parcelable FiraTwrMeasurement {

@@ -1,5 +1,22 @@
 package aidl.hardware.dalix.uwb;
 
+import aidl.hardware.dalix.uwb.AoaResultRequest;
+import aidl.hardware.dalix.uwb.AoaType;
+import aidl.hardware.dalix.uwb.BprfPhrDataRate;
+import aidl.hardware.dalix.uwb.DeviceRole;
+import aidl.hardware.dalix.uwb.DeviceType;
+import aidl.hardware.dalix.uwb.FcsType;
+import aidl.hardware.dalix.uwb.FiraStsConfig;
+import aidl.hardware.dalix.uwb.MultiNodeMode;
+import aidl.hardware.dalix.uwb.PreambleDuration;
+import aidl.hardware.dalix.uwb.PrfMode;
+import aidl.hardware.dalix.uwb.PsduDataRate;
+import aidl.hardware.dalix.uwb.RangingRoundControl;
+import aidl.hardware.dalix.uwb.RangingRoundUsage;
+import aidl.hardware.dalix.uwb.ResultReportConfig;
+import aidl.hardware.dalix.uwb.RframeConfig;
+import aidl.hardware.dalix.uwb.UwbAddress;
+
 // The configuration of one FiRa two-way-ranging session.
 @VintfStability
 parcelable FiraTwrSession {

@@ -1,5 +1,11 @@
 package aidl.hardware.dalix.uwb;
 
+import aidl.hardware.dalix.uwb.FiraCapabilities;
+import aidl.hardware.dalix.uwb.FiraTwrSession;
+import aidl.hardware.dalix.uwb.IFiraSessionCallback;
+import aidl.hardware.dalix.uwb.IFiraStateCallback;
+import aidl.hardware.dalix.uwb.UwbAddress;
+
 @VintfStability
 interface IFiraController {
     void setStateCallback(IFiraStateCallback callback);

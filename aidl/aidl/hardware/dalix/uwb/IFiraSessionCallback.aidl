@@ -1,5 +1,9 @@
 package aidl.hardware.dalix.uwb;
 
+import aidl.hardware.dalix.uwb.FiraRangingData;
+import aidl.hardware.dalix.uwb.FiraTwrMeasurement;
+import aidl.hardware.dalix.uwb.UwbAddress;
+
 @VintfStability
 interface IFiraSessionCallback {
     void onTwrResult(in FiraRangingData data, in FiraTwrMeasurement[] measurements);

@@ -1,5 +1,7 @@
 package aidl.hardware.dalix.uwb;
 
+import aidl.hardware.dalix.uwb.RangingResult;
+
 @VintfStability
 interface ISimpleRangingCallback {
     void onRangingResult(in RangingResult result);

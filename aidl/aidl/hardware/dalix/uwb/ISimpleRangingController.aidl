@@ -1,5 +1,9 @@
 package aidl.hardware.dalix.uwb;
 
+import aidl.hardware.dalix.uwb.ISimpleRangingCallback;
+import aidl.hardware.dalix.uwb.RangingRequest;
+import aidl.hardware.dalix.uwb.UwbCapabilities;
+
 @VintfStability
 interface ISimpleRangingController {
     void startInitiatorMode(int panId, long address, int channel);

@@ -1,5 +1,8 @@
 package aidl.hardware.dalix.uwb;
 
+import aidl.hardware.dalix.uwb.IUwbClientCallback;
+import aidl.hardware.dalix.uwb.IUwbIface;
+
 // The root service object, one per device.
 @VintfStability
 interface IUwb {

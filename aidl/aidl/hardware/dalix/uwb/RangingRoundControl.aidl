@@ -1,5 +1,7 @@
 package aidl.hardware.dalix.uwb;
 
+import aidl.hardware.dalix.uwb.MeasurementReportType;
+
 @VintfStability
 parcelable RangingRoundControl {
     boolean hasResultReportPhase;

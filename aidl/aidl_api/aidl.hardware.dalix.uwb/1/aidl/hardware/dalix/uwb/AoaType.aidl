@@ -17,11 +17,9 @@
 // later when a module using the interface is updated, e.g., Mainline modules.
 
 package aidl.hardware.dalix.uwb;
-
-@VintfStability
-@Backing(type="byte")
+@Backing(type="byte") @VintfStability
 enum AoaType {
-    AZIMUTH = 0,
-    ELEVATION = 1,
-    AZIMUTH_AND_ELEVATION = 2,
+  AZIMUTH = 0,
+  ELEVATION = 1,
+  AZIMUTH_AND_ELEVATION = 2,
 }

@@ -17,10 +17,8 @@
 // later when a module using the interface is updated, e.g., Mainline modules.
 
 package aidl.hardware.dalix.uwb;
-
-@VintfStability
-@Backing(type="byte")
+@Backing(type="byte") @VintfStability
 enum FcsType {
-    CRC_16 = 0,
-    CRC_32 = 1,
+  CRC_16 = 0,
+  CRC_32 = 1,
 }

@@ -17,11 +17,9 @@
 // later when a module using the interface is updated, e.g., Mainline modules.
 
 package aidl.hardware.dalix.uwb;
-
-@VintfStability
-@Backing(type="byte")
+@Backing(type="byte") @VintfStability
 enum FiraStsConfig {
-    STATIC = 0,
-    DYNAMIC = 1,
-    DYNAMIC_FOR_CONTROLEE_INDIVIDUAL_KEY = 2,
+  STATIC = 0,
+  DYNAMIC = 1,
+  DYNAMIC_FOR_CONTROLEE_INDIVIDUAL_KEY = 2,
 }

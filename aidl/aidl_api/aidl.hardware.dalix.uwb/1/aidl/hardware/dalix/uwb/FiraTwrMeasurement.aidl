@@ -17,20 +17,16 @@
 // later when a module using the interface is updated, e.g., Mainline modules.
 
 package aidl.hardware.dalix.uwb;
-
-// The result for one peer. Field order is the service's own.
 @VintfStability
 parcelable FiraTwrMeasurement {
-    UwbAddress address;
-    long timestampNs;
-    // 0 is success; any other status leaves the fields below at their defaults.
-    byte status;
-    int distance;
-    // 1 line of sight, 0 none, -1 (255) unknown.
-    byte lineOfSight;
-    FiraAntennaMeasurement[] antennaMeasurements;
-    double azimuthRad;
-    double azimuthFigureOfMerit;
-    double elevationRad;
-    double elevationFigureOfMerit;
+  aidl.hardware.dalix.uwb.UwbAddress address;
+  long timestampNs;
+  byte status;
+  int distance;
+  byte lineOfSight;
+  aidl.hardware.dalix.uwb.FiraAntennaMeasurement[] antennaMeasurements;
+  double azimuthRad;
+  double azimuthFigureOfMerit;
+  double elevationRad;
+  double elevationFigureOfMerit;
 }

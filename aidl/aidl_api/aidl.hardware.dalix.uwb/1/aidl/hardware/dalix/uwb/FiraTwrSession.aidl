@@ -17,47 +17,44 @@
 // later when a module using the interface is updated, e.g., Mainline modules.
 
 package aidl.hardware.dalix.uwb;
-
-// The configuration of one FiRa two-way-ranging session.
 @VintfStability
 parcelable FiraTwrSession {
-    int id;
-    DeviceType deviceType;
-    DeviceRole deviceRole;
-    RangingRoundUsage rangingRoundUsage;
-    MultiNodeMode multiNodeMode;
-    UwbAddress deviceAddress;
-    UwbAddress[] destAddressList;
-    int initiationTimeMs;
-    int slotDurationRstu;
-    int slotsPerRangingRound;
-    int rangingBlockDurationMs;
-    int blockStridingValue;
-    int maxRangingRoundRetries;
-    boolean isHoppingEnabled;
-    boolean isBlockStridingEnabled;
-    byte sessionPriority;
-    RangingRoundControl rangingRoundControl;
-    byte inBandTerminationAttemptCount;
-    int channelNumber;
-    byte preambleCodeIndex;
-    RframeConfig rframeConfig;
-    PrfMode prfMode;
-    PreambleDuration preambleDuration;
-    byte sfdId;
-    byte stsSegmentCount;
-    PsduDataRate psduDataRate;
-    BprfPhrDataRate bprfPhrDataRate;
-    FcsType fcsType;
-    boolean isTxAdaptivePayloadPowerEnabled;
-    AoaType aoaType;
-    FiraStsConfig stsConfig;
-    int subSessionId;
-    // vendorId and staticStsIV are used with static STS only.
-    byte[] vendorId;
-    byte[] staticStsIV;
-    boolean isKeyRotationEnabled;
-    byte keyRotationRate;
-    AoaResultRequest aoaResultRequest;
-    ResultReportConfig resultReportConfig;
+  int id;
+  aidl.hardware.dalix.uwb.DeviceType deviceType;
+  aidl.hardware.dalix.uwb.DeviceRole deviceRole;
+  aidl.hardware.dalix.uwb.RangingRoundUsage rangingRoundUsage;
+  aidl.hardware.dalix.uwb.MultiNodeMode multiNodeMode;
+  aidl.hardware.dalix.uwb.UwbAddress deviceAddress;
+  aidl.hardware.dalix.uwb.UwbAddress[] destAddressList;
+  int initiationTimeMs;
+  int slotDurationRstu;
+  int slotsPerRangingRound;
+  int rangingBlockDurationMs;
+  int blockStridingValue;
+  int maxRangingRoundRetries;
+  boolean isHoppingEnabled;
+  boolean isBlockStridingEnabled;
+  byte sessionPriority;
+  aidl.hardware.dalix.uwb.RangingRoundControl rangingRoundControl;
+  byte inBandTerminationAttemptCount;
+  int channelNumber;
+  byte preambleCodeIndex;
+  aidl.hardware.dalix.uwb.RframeConfig rframeConfig;
+  aidl.hardware.dalix.uwb.PrfMode prfMode;
+  aidl.hardware.dalix.uwb.PreambleDuration preambleDuration;
+  byte sfdId;
+  byte stsSegmentCount;
+  aidl.hardware.dalix.uwb.PsduDataRate psduDataRate;
+  aidl.hardware.dalix.uwb.BprfPhrDataRate bprfPhrDataRate;
+  aidl.hardware.dalix.uwb.FcsType fcsType;
+  boolean isTxAdaptivePayloadPowerEnabled;
+  aidl.hardware.dalix.uwb.AoaType aoaType;
+  aidl.hardware.dalix.uwb.FiraStsConfig stsConfig;
+  int subSessionId;
+  byte[] vendorId;
+  byte[] staticStsIV;
+  boolean isKeyRotationEnabled;
+  byte keyRotationRate;
+  aidl.hardware.dalix.uwb.AoaResultRequest aoaResultRequest;
+  aidl.hardware.dalix.uwb.ResultReportConfig resultReportConfig;
 }

@@ -17,22 +17,21 @@
 // later when a module using the interface is updated, e.g., Mainline modules.
 
 package aidl.hardware.dalix.uwb;
-
 @VintfStability
 interface IFiraController {
-    void setStateCallback(IFiraStateCallback callback);
-    void clearStateCallback();
-    void setSessionCallback(IFiraSessionCallback callback);
-    void clearSessionCallback();
-    void getCapabilities(out FiraCapabilities capabilities);
-    void initNewTwrSession(in FiraTwrSession session);
-    void updateTwrSession(in FiraTwrSession session);
-    void startRangingSession(int sessionId);
-    void updateTwoWayRangingBlockStriding(int sessionId, int blockStridingValue);
-    void addControlees(int sessionId, in UwbAddress[] controlees, in @nullable int[] subSessionIds);
-    void removeControlees(int sessionId, in UwbAddress[] controlees);
-    void stopRangingSession(int sessionId);
-    int getSessionCount();
-    void deinitSession(int sessionId);
-    void reset();
+  void setStateCallback(aidl.hardware.dalix.uwb.IFiraStateCallback callback);
+  void clearStateCallback();
+  void setSessionCallback(aidl.hardware.dalix.uwb.IFiraSessionCallback callback);
+  void clearSessionCallback();
+  void getCapabilities(out aidl.hardware.dalix.uwb.FiraCapabilities capabilities);
+  void initNewTwrSession(in aidl.hardware.dalix.uwb.FiraTwrSession session);
+  void updateTwrSession(in aidl.hardware.dalix.uwb.FiraTwrSession session);
+  void startRangingSession(int sessionId);
+  void updateTwoWayRangingBlockStriding(int sessionId, int blockStridingValue);
+  void addControlees(int sessionId, in aidl.hardware.dalix.uwb.UwbAddress[] controlees, in @nullable int[] subSessionIds);
+  void removeControlees(int sessionId, in aidl.hardware.dalix.uwb.UwbAddress[] controlees);
+  void stopRangingSession(int sessionId);
+  int getSessionCount();
+  void deinitSession(int sessionId);
+  void reset();
 }

@@ -17,15 +17,12 @@
 // later when a module using the interface is updated, e.g., Mainline modules.
 
 package aidl.hardware.dalix.uwb;
-
 @VintfStability
 interface IFiraSessionCallback {
-    void onTwrResult(in FiraRangingData data, in FiraTwrMeasurement[] measurements);
-    void onControleesAdded(int sessionId, in UwbAddress[] controlees);
-    // reason is always 0.
-    void onControleesAddFailed(int sessionId, in UwbAddress[] controlees, int reason);
-    void onControleesRemoved(int sessionId, in UwbAddress[] controlees);
-    // reason is always 0.
-    void onControleesRemoveFailed(int sessionId, in UwbAddress[] controlees, int reason);
-    void onSessionStopped(int sessionId);
+  void onTwrResult(in aidl.hardware.dalix.uwb.FiraRangingData data, in aidl.hardware.dalix.uwb.FiraTwrMeasurement[] measurements);
+  void onControleesAdded(int sessionId, in aidl.hardware.dalix.uwb.UwbAddress[] controlees);
+  void onControleesAddFailed(int sessionId, in aidl.hardware.dalix.uwb.UwbAddress[] controlees, int reason);
+  void onControleesRemoved(int sessionId, in aidl.hardware.dalix.uwb.UwbAddress[] controlees);
+  void onControleesRemoveFailed(int sessionId, in aidl.hardware.dalix.uwb.UwbAddress[] controlees, int reason);
+  void onSessionStopped(int sessionId);
 }

@@ -17,8 +17,7 @@
 // later when a module using the interface is updated, e.g., Mainline modules.
 
 package aidl.hardware.dalix.uwb;
-
 @VintfStability
 interface ISimpleRangingCallback {
-    void onRangingResult(in RangingResult result);
+  void onRangingResult(in aidl.hardware.dalix.uwb.RangingResult result);
 }

@@ -17,9 +17,6 @@
 // later when a module using the interface is updated, e.g., Mainline modules.
 
 package aidl.hardware.dalix.uwb;
-
-// Passed by the client at open. The service only watches its binder for
-// death and calls none of its operations, so it declares none.
 @VintfStability
 interface IUwbClientCallback {
 }

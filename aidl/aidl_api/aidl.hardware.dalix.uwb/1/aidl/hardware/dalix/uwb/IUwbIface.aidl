@@ -17,11 +17,9 @@
 // later when a module using the interface is updated, e.g., Mainline modules.
 
 package aidl.hardware.dalix.uwb;
-
-// One radio and its controllers.
 @VintfStability
 interface IUwbIface {
-    IFiraController firaController();
-    ICccController cccController();
-    ISimpleRangingController simpleRangingController();
+  aidl.hardware.dalix.uwb.IFiraController firaController();
+  aidl.hardware.dalix.uwb.ICccController cccController();
+  aidl.hardware.dalix.uwb.ISimpleRangingController simpleRangingController();
 }

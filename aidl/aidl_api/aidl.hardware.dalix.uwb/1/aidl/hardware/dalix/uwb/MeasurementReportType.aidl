@@ -17,10 +17,8 @@
 // later when a module using the interface is updated, e.g., Mainline modules.
 
 package aidl.hardware.dalix.uwb;
-
-@VintfStability
-@Backing(type="byte")
+@Backing(type="byte") @VintfStability
 enum MeasurementReportType {
-    INITIATOR_TO_RESPONDER = 0,
-    RESPONDER_TO_INITIATOR = 1,
+  INITIATOR_TO_RESPONDER = 0,
+  RESPONDER_TO_INITIATOR = 1,
 }

@@ -17,13 +17,9 @@
 // later when a module using the interface is updated, e.g., Mainline modules.
 
 package aidl.hardware.dalix.uwb;
-
-// One simple ranging request. Field order is the service's own.
 @VintfStability
 parcelable RangingRequest {
-    int id;
-    // Passed to the driver unchanged.
-    int parameter;
-    // The peer's extended address.
-    long peerAddress;
+  int id;
+  int parameter;
+  long peerAddress;
 }

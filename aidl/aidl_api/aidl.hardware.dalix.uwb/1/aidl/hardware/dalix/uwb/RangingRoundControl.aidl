@@ -17,10 +17,9 @@
 // later when a module using the interface is updated, e.g., Mainline modules.
 
 package aidl.hardware.dalix.uwb;
-
 @VintfStability
 parcelable RangingRoundControl {
-    boolean hasResultReportPhase;
-    MeasurementReportType measurementReportType;
-    boolean hasDeferredMode;
+  boolean hasResultReportPhase;
+  aidl.hardware.dalix.uwb.MeasurementReportType measurementReportType;
+  boolean hasDeferredMode;
 }

@@ -17,11 +17,9 @@
 // later when a module using the interface is updated, e.g., Mainline modules.
 
 package aidl.hardware.dalix.uwb;
-
-@VintfStability
-@Backing(type="byte")
+@Backing(type="byte") @VintfStability
 enum RangingRoundUsage {
-    OWR = 0,
-    SS_TWR = 1,
-    DS_TWR = 2,
+  OWR = 0,
+  SS_TWR = 1,
+  DS_TWR = 2,
 }

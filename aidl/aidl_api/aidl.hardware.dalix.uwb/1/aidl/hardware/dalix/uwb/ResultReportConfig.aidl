@@ -17,11 +17,10 @@
 // later when a module using the interface is updated, e.g., Mainline modules.
 
 package aidl.hardware.dalix.uwb;
-
 @VintfStability
 parcelable ResultReportConfig {
-    boolean hasTimeOfFlightReport;
-    boolean hasAngleOfArrivalAzimuthReport;
-    boolean hasAngleOfArrivalElevationReport;
-    boolean hasAngleOfArrivalFigureOfMeritReport;
+  boolean hasTimeOfFlightReport;
+  boolean hasAngleOfArrivalAzimuthReport;
+  boolean hasAngleOfArrivalElevationReport;
+  boolean hasAngleOfArrivalFigureOfMeritReport;
 }

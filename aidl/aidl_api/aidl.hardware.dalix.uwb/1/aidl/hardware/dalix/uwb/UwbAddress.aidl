@@ -17,9 +17,7 @@
 // later when a module using the interface is updated, e.g., Mainline modules.
 
 package aidl.hardware.dalix.uwb;
-
 @VintfStability
 parcelable UwbAddress {
-    // First byte first; FiRa sessions take 2-byte short addresses only.
-    byte[] address;
+  byte[] address;
 }

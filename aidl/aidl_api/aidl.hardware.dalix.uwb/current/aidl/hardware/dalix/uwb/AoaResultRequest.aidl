@@ -17,10 +17,8 @@
 // later when a module using the interface is updated, e.g., Mainline modules.
 
 package aidl.hardware.dalix.uwb;
-
-@VintfStability
-@Backing(type="byte")
+@Backing(type="byte") @VintfStability
 enum AoaResultRequest {
-    NO_AOA_REPORT = 0,
-    REQ_AOA_RESULTS = 1,
+  NO_AOA_REPORT = 0,
+  REQ_AOA_RESULTS = 1,
 }

@@ -17,10 +17,8 @@
 // later when a module using the interface is updated, e.g., Mainline modules.
 
 package aidl.hardware.dalix.uwb;
-
-@VintfStability
-@Backing(type="byte")
+@Backing(type="byte") @VintfStability
 enum BprfPhrDataRate {
-    RATE_850K = 0,
-    RATE_6M81 = 1,
+  RATE_850K = 0,
+  RATE_6M81 = 1,
 }

@@ -17,10 +17,8 @@
 // later when a module using the interface is updated, e.g., Mainline modules.
 
 package aidl.hardware.dalix.uwb;
-
-@VintfStability
-@Backing(type="byte")
+@Backing(type="byte") @VintfStability
 enum DeviceRole {
-    RESPONDER = 0,
-    INITIATOR = 1,
+  RESPONDER = 0,
+  INITIATOR = 1,
 }

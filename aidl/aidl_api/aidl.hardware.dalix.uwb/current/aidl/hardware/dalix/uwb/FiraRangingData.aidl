@@ -17,11 +17,8 @@
 // later when a module using the interface is updated, e.g., Mainline modules.
 
 package aidl.hardware.dalix.uwb;
-
-// One FiRa ranging notification. Field order is the service's own.
 @VintfStability
 parcelable FiraRangingData {
-    int sessionId;
-    // The driver's ranging counter (unsigned 32-bit on the wire).
-    int index;
+  int sessionId;
+  int index;
 }

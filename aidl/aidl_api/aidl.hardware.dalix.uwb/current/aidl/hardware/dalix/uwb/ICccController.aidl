@@ -17,11 +17,9 @@
 // later when a module using the interface is updated, e.g., Mainline modules.
 
 package aidl.hardware.dalix.uwb;
-
 @VintfStability
 interface ICccController {
-    void openCccSession();
-    void onOpenCccSessionDone();
-    // Returns the value the driver reports for the started session.
-    long startCccSession(int first, long timeref, int channel);
+  void openCccSession();
+  void onOpenCccSessionDone();
+  long startCccSession(int first, long timeref, int channel);
 }

@@ -17,9 +17,6 @@
 // later when a module using the interface is updated, e.g., Mainline modules.
 
 package aidl.hardware.dalix.uwb;
-
-// Stored by the FiRa controller; the service calls none of its operations,
-// so it declares none.
 @VintfStability
 interface IFiraStateCallback {
 }

@@ -17,13 +17,12 @@
 // later when a module using the interface is updated, e.g., Mainline modules.
 
 package aidl.hardware.dalix.uwb;
-
 @VintfStability
 interface ISimpleRangingController {
-    void startInitiatorMode(int panId, long address, int channel);
-    void startResponderMode(int panId, long address, int channel);
-    void setRangings(in RangingRequest[] requests);
-    void getCapabilities(out UwbCapabilities capabilities);
-    void stop();
-    void setCallback(ISimpleRangingCallback callback);
+  void startInitiatorMode(int panId, long address, int channel);
+  void startResponderMode(int panId, long address, int channel);
+  void setRangings(in aidl.hardware.dalix.uwb.RangingRequest[] requests);
+  void getCapabilities(out aidl.hardware.dalix.uwb.UwbCapabilities capabilities);
+  void stop();
+  void setCallback(aidl.hardware.dalix.uwb.ISimpleRangingCallback callback);
 }

@@ -17,14 +17,12 @@
 // later when a module using the interface is updated, e.g., Mainline modules.
 
 package aidl.hardware.dalix.uwb;
-
-// The root service object, one per device.
 @VintfStability
 interface IUwb {
-    void open(IUwbClientCallback callback);
-    void listIfaceNames(out List<String> names);
-    IUwbIface getIface(String name);
-    void close();
-    void loadCalibration(long hwIndex, String path);
-    void listHardwareIndex(out long[] hwIndices);
+  void open(aidl.hardware.dalix.uwb.IUwbClientCallback callback);
+  void listIfaceNames(out List<String> names);
+  aidl.hardware.dalix.uwb.IUwbIface getIface(String name);
+  void close();
+  void loadCalibration(long hwIndex, String path);
+  void listHardwareIndex(out long[] hwIndices);
 }

@@ -17,11 +17,9 @@
 // later when a module using the interface is updated, e.g., Mainline modules.
 
 package aidl.hardware.dalix.uwb;
-
-@VintfStability
-@Backing(type="byte")
+@Backing(type="byte") @VintfStability
 enum MultiNodeMode {
-    UNICAST = 0,
-    ONE_TO_MANY = 1,
-    MANY_TO_MANY = 2,
+  UNICAST = 0,
+  ONE_TO_MANY = 1,
+  MANY_TO_MANY = 2,
 }

@@ -17,10 +17,8 @@
 // later when a module using the interface is updated, e.g., Mainline modules.
 
 package aidl.hardware.dalix.uwb;
-
-@VintfStability
-@Backing(type="byte")
+@Backing(type="byte") @VintfStability
 enum PreambleDuration {
-    T32_SYMBOLS = 0,
-    T64_SYMBOLS = 1,
+  T32_SYMBOLS = 0,
+  T64_SYMBOLS = 1,
 }

@@ -17,12 +17,10 @@
 // later when a module using the interface is updated, e.g., Mainline modules.
 
 package aidl.hardware.dalix.uwb;
-
-@VintfStability
-@Backing(type="byte")
+@Backing(type="byte") @VintfStability
 enum PsduDataRate {
-    RATE_6M81 = 0,
-    RATE_7M80 = 1,
-    RATE_27M2 = 2,
-    RATE_31M2 = 3,
+  RATE_6M81 = 0,
+  RATE_7M80 = 1,
+  RATE_27M2 = 2,
+  RATE_31M2 = 3,
 }

@@ -17,13 +17,11 @@
 // later when a module using the interface is updated, e.g., Mainline modules.
 
 package aidl.hardware.dalix.uwb;
-
-// One simple ranging result. Field order is the service's own.
 @VintfStability
 parcelable RangingResult {
-    int id;
-    long peerAddress;
-    int measurement;
-    float firstAngleRad;
-    float secondAngleRad;
+  int id;
+  long peerAddress;
+  int measurement;
+  float firstAngleRad;
+  float secondAngleRad;
 }

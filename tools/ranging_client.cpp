@@ -1,6 +1,7 @@
 #include "tools/ranging_client.h"
 
 #include <math.h>
+#include <string.h>
 
 #include <algorithm>
 #include <tuple>
@@ -21,7 +22,7 @@ namespace {
 // The driver reports FiRa and simple ranging distances in centimetres.
 constexpr double kMetresPerUnit = 0.01;
 // How long the driver gets to report a stopped session before deinit.
-constexpr std::chrono::seconds kStopReportTimeout(2);
+constexpr std::chrono::seconds kStopReportTimeout(3);
 constexpr std::chrono::seconds kRateWindow(1);
 
 bool Check(const ndk::ScopedAStatus& status, const char* call, std::string* error) {
@@ -36,7 +37,14 @@ uwb::UwbAddress ShortAddress(uint16_t address) {
   return result;
 }
 
+// A result names its peer by the 16-bit address in memory order; any other
+// size is read as a big-endian number.
 uint64_t AddressValue(const uwb::UwbAddress& address) {
+  if (address.address.size() == sizeof(uint16_t)) {
+    uint16_t value;
+    memcpy(&value, address.address.data(), sizeof(value));
+    return value;
+  }
   uint64_t value = 0;
   for (uint8_t byte : address.address) value = (value << 8) | byte;
   return value;
@@ -75,6 +83,7 @@ class RangingClient::FiraCallback : public uwb::BnFiraSessionCallback {
       reading.elevation_rad = measurement.elevationRad;
       const auto los = static_cast<uint8_t>(measurement.lineOfSight);
       reading.line_of_sight = los <= 1 ? los : -1;
+      reading.timestamp_ns = measurement.timestampNs;
       client_->Record(key, reading);
     }
     return ndk::ScopedAStatus::ok();
@@ -284,6 +293,7 @@ void RangingClient::Record(const Key& key, const std::optional<PeerReading>& mea
     reading.azimuth_rad = measurement->azimuth_rad;
     reading.elevation_rad = measurement->elevation_rad;
     reading.line_of_sight = measurement->line_of_sight;
+    reading.timestamp_ns = measurement->timestamp_ns;
     track.recent.push_back(now);
   } else {
     reading.measured = false;

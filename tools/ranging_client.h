@@ -39,6 +39,9 @@ struct PeerReading {
   double elevation_rad = 0;
   // 1 line of sight, 0 none, -1 unknown (simple ranging never tells).
   int line_of_sight = -1;
+  // When the radio measured, CLOCK_MONOTONIC of the device; 0 when the
+  // result does not say (simple ranging).
+  int64_t timestamp_ns = 0;
   uint64_t results = 0;
   uint64_t failures = 0;
   // Over the last second.

@@ -128,7 +128,7 @@ class Recorder {
 
   // One line per peer and radio; false when a peer was never measured or
   // erred beyond |bound|.
-  bool Summary(int peers, double bound, std::string* text) {
+  bool Summary(int peers, std::string* text) {
     std::lock_guard<std::mutex> lock(mutex_);
     bool ok = true;
     std::map<std::string, int> peers_per_radio;
@@ -141,7 +141,7 @@ class Recorder {
                stats.measured, mean, stats.max_abs_error);
       *text += line;
       if (stats.measured > 0) ++peers_per_radio[key.second];
-      if (stats.measured == 0 || stats.max_abs_error > bound) ok = false;
+      if (stats.measured == 0 || stats.max_abs_error > site_->ErrorBound(stats.mode)) ok = false;
     }
     for (const char* radio : {DemoSite::kFiraRadio, DemoSite::kSimpleRangingRadio}) {
       if (peers_per_radio[radio] != peers) {
@@ -248,6 +248,7 @@ int Run(const DemoOptions& options) {
     client.SetResultListener([&recorder](const tools::PeerReading& r) { recorder.Add(r); });
     std::vector<std::string> radios;
     tools::FiraOptions fira;
+    fira.block_duration_ms = DemoSite::kFiraBlockMs;
     fira.controlees = site.ShortAddresses();
     tools::SimpleRangingOptions simple;
     simple.peers = site.ExtendedAddresses();
@@ -305,7 +306,7 @@ int Run(const DemoOptions& options) {
   service.Stop();
 
   std::string summary;
-  const bool accurate = recorder.Summary(options.peers, site.ErrorBound(), &summary);
+  const bool accurate = recorder.Summary(options.peers, &summary);
   printf("%s", summary.c_str());
   if (!options.plot_path.empty()) {
     if (!recorder.WritePlot(options.plot_path, &error)) {

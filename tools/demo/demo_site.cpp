@@ -21,6 +21,12 @@ constexpr double kAngleSigmaRad = 0.02;
 // whole centimetres.
 constexpr double kErrorBoundM = 5 * kDistanceSigmaM + 0.01;
 constexpr double kHalfWidthM = 7;
+// Simple ranging reports come at the rate of FiRa notifications.
+constexpr int32_t kSimpleRangingPeriodPerPeerMs = DemoSite::kFiraBlockMs;
+// Simple ranging results carry no time: they are compared with the truth
+// when they arrive, up to a few report periods late, and the peers walk at
+// up to 1.2 m/s.
+constexpr double kSimpleRangingLagM = 1.2 * 0.25;
 
 // Both radios stand a little apart, looking the same way (along y, the
 // top of the map), at desk height.
@@ -55,6 +61,10 @@ bool DemoSite::Start(std::string* error) {
   world.PlaceRadio(kFiraHw, kRadioPoses[0]);
   world.PlaceRadio(kSimpleRangingHw, kRadioPoses[1]);
   world.SetNoise(kDistanceSigmaM, kAngleSigmaRad, seed_);
+  // The service's one thread reads one simple ranging report each time the
+  // FiRa socket it also watches delivers a notification; reports must come
+  // slower than that, or they queue up and age.
+  driver_.SetSimpleRangingPeriod(kSimpleRangingPeriodPerPeerMs * peers_);
 
   // Peers walk circles in front of the radios, each its own size, speed and
   // height; the seed picks them.
@@ -113,7 +123,10 @@ std::optional<Truth> DemoSite::TruthOf(const tools::PeerReading& reading) const 
   if (mark == '?') return std::nullopt;
   const sim::Peer& peer = world_->peers[mark - 'A'];
   const uint32_t hw = reading.radio == kFiraRadio ? kFiraHw : kSimpleRangingHw;
-  const double time_s = driver_.world().SecondsAt(MonotonicNs());
+  // At the moment of the measurement when the result tells it, else now.
+  const uint64_t when_ns =
+      reading.timestamp_ns > 0 ? static_cast<uint64_t>(reading.timestamp_ns) : MonotonicNs();
+  const double time_s = driver_.world().SecondsAt(when_ns);
   std::optional<sim::Observation> seen = driver_.world().Truth(hw, peer.short_address, time_s);
   if (!seen) return std::nullopt;
   Truth truth;
@@ -145,7 +158,9 @@ Point DemoSite::MapCentre() const { return {0, kHalfWidthM / 2}; }
 
 double DemoSite::HalfWidth() const { return kHalfWidthM; }
 
-double DemoSite::ErrorBound() const { return kErrorBoundM; }
+double DemoSite::ErrorBound(tools::RangingMode mode) const {
+  return mode == tools::RangingMode::kFira ? kErrorBoundM : kErrorBoundM + kSimpleRangingLagM;
+}
 
 }  // namespace demo
 }  // namespace dalix

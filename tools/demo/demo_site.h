@@ -22,6 +22,9 @@ class DemoSite {
  public:
   static constexpr char kFiraRadio[] = "uwb0";
   static constexpr char kSimpleRangingRadio[] = "uwb1";
+  // Short blocks keep the service's loop turning: each FiRa notification is
+  // also a turn for the other sockets it watches.
+  static constexpr int32_t kFiraBlockMs = 50;
 
   DemoSite(int peers, uint32_t seed);
   ~DemoSite();
@@ -43,8 +46,8 @@ class DemoSite {
   Point MapCentre() const;
   double HalfWidth() const;
   // The largest distance error that the simulated noise and the encoding's
-  // resolution allow.
-  double ErrorBound() const;
+  // resolution allow, and for simple ranging the lag of its results.
+  double ErrorBound(tools::RangingMode mode) const;
 
  private:
   struct World;

@@ -5,6 +5,7 @@
 #include <algorithm>
 #include <utility>
 
+#include <android-base/file.h>
 #include <android-base/logging.h>
 #include <android/binder_ibinder.h>
 
@@ -171,6 +172,19 @@ ndk::ScopedAStatus Uwb::loadCalibration(int64_t hw_index, const std::string& pat
   }
   return ndk::ScopedAStatus::fromExceptionCodeWithMessage(EX_ILLEGAL_ARGUMENT,
                                                           "Unkown hw index");
+}
+
+binder_status_t Uwb::dump(int fd, const char** /*args*/, uint32_t /*num_args*/) {
+  std::string text = "UWB HAL: ";
+  if (g_client == nullptr) {
+    text += "closed\n";
+  } else {
+    text += std::string("open, client ") +
+            (AIBinder_isAlive(g_client->asBinder().get()) ? "alive" : "dead") + ", " +
+            std::to_string(ifaces_.size()) + " radio(s)\n";
+  }
+  for (auto& [name, iface] : ifaces_) iface->Dump(&text);
+  return android::base::WriteStringToFd(text, fd) ? STATUS_OK : STATUS_FAILED_TRANSACTION;
 }
 
 ndk::ScopedAStatus Uwb::listHardwareIndex(std::vector<int64_t>* hw_indices) {

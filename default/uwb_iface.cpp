@@ -2,6 +2,9 @@
 
 #include "uwb_iface.h"
 
+#include <stdio.h>
+
+#include <string>
 #include <utility>
 
 #include <android-base/logging.h>
@@ -58,15 +61,39 @@ bool UwbIface::Stop() {
 bool UwbIface::LoadCalibration(const char* path) {
   LOG(INFO) << "Load calibration on " << name_ << ", hw index: " << hw_index_;
   ConfigUtils calibration;
-  if (!calibration.Load(path)) return false;
-  return mcps_utils_->SetCalibration(hw_index_, &calibration);
+  const bool loaded =
+      calibration.Load(path) && mcps_utils_->SetCalibration(hw_index_, &calibration);
+  calibration_load_ = std::string(path) + (loaded ? ": loaded" : ": failed");
+  return loaded;
 }
 
 bool UwbIface::LoadHalProperties(const char* path) {
   LOG(INFO) << "Load properties on " << name_ << ", hw index: " << hw_index_;
   ConfigUtils properties;
-  if (!properties.Load(path)) return false;
-  return fira_controller_->SetProperties(properties);
+  const bool loaded = properties.Load(path) && fira_controller_->SetProperties(properties);
+  properties_load_ = std::string(path) + (loaded ? ": loaded" : ": failed");
+  return loaded;
+}
+
+void UwbIface::Dump(std::string* out) {
+  bool ok = false;
+  const McpsHwInfo hw = mcps_utils_->GetHardwareInfo(hw_index_, &ok);
+  char line[160];
+  snprintf(line, sizeof(line), "radio %s: hw index %u, phy %s, scheduler %s, interface %s\n",
+           name_.c_str(), hw_index_, ok ? std::to_string(hw.phy_index).c_str() : "?",
+           ok ? (hw.scheduler.empty() ? "(none)" : hw.scheduler.c_str()) : "? (no answer)",
+           interface_tool_->GetUpState(name_.c_str()) ? "up" : "down");
+  *out += line;
+  *out += "  calibration: " + calibration_load_ + "\n";
+  *out += "  HAL properties: " + properties_load_ + "\n";
+  fira_controller_->Dump(out);
+  const std::vector<uwb::RangingRequest> requests = mcps_utils_->InstalledRangingRequests();
+  *out += "  simple ranging: " + std::to_string(requests.size()) + " request(s)\n";
+  for (const uwb::RangingRequest& request : requests) {
+    snprintf(line, sizeof(line), "    request %d: peer %016llx, parameter %d\n", request.id,
+             static_cast<unsigned long long>(request.peerAddress), request.parameter);
+    *out += line;
+  }
 }
 
 }  // namespace dalix

@@ -48,10 +48,10 @@ class UwbIface : public aidl::hardware::dalix::uwb::BnUwbIface {
   // antenna properties.
   bool LoadHalProperties(const char* path);
 
-  const std::shared_ptr<FiraController>& fira() const { return fira_controller_; }
-  const std::shared_ptr<SimpleRangingController>& simple_ranging() const {
-    return simple_ranging_controller_;
-  }
+  // Appends what a dump shows of this radio: its scheduler and up state as
+  // the driver tells them now, the files loaded, the FiRa sessions and the
+  // simple ranging requests.
+  void Dump(std::string* out);
 
  private:
   const std::string name_;
@@ -61,6 +61,9 @@ class UwbIface : public aidl::hardware::dalix::uwb::BnUwbIface {
   std::shared_ptr<FiraController> fira_controller_;
   std::shared_ptr<CccController> ccc_controller_;
   std::shared_ptr<SimpleRangingController> simple_ranging_controller_;
+  // The last load of each kind: the path and whether it went through.
+  std::string calibration_load_ = "none";
+  std::string properties_load_ = "none";
 };
 
 }  // namespace dalix

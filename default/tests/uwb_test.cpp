@@ -6,10 +6,14 @@
 #include <stdio.h>
 #include <unistd.h>
 
+#include <chrono>
+#include <condition_variable>
 #include <memory>
+#include <mutex>
 #include <string>
 #include <vector>
 
+#include <aidl/aidl/hardware/dalix/uwb/BnFiraSessionCallback.h>
 #include <aidl/aidl/hardware/dalix/uwb/BnUwbClientCallback.h>
 #include <android/binder_manager.h>
 #include <binder_host/host.h>
@@ -22,6 +26,8 @@
 #include "sim/service_thread.h"
 #include "sim/simulated_driver.h"
 #include "tests/log_capture.h"
+#include "tools/ranging_client.h"
+#include "tools/service_dump.h"
 
 namespace hardware {
 namespace dalix {
@@ -32,6 +38,43 @@ using ::testing::ElementsAre;
 using ::testing::IsEmpty;
 
 class Client : public uwb::BnUwbClientCallback {};
+
+// Counts FiRa results; the service calls it on its thread.
+class FiraResults : public uwb::BnFiraSessionCallback {
+ public:
+  ndk::ScopedAStatus onTwrResult(const uwb::FiraRangingData&,
+                                 const std::vector<uwb::FiraTwrMeasurement>&) override {
+    std::lock_guard<std::mutex> lock(mutex_);
+    ++results_;
+    changed_.notify_all();
+    return ndk::ScopedAStatus::ok();
+  }
+  ndk::ScopedAStatus onControleesAdded(int32_t, const std::vector<uwb::UwbAddress>&) override {
+    return ndk::ScopedAStatus::ok();
+  }
+  ndk::ScopedAStatus onControleesAddFailed(int32_t, const std::vector<uwb::UwbAddress>&,
+                                           int32_t) override {
+    return ndk::ScopedAStatus::ok();
+  }
+  ndk::ScopedAStatus onControleesRemoved(int32_t, const std::vector<uwb::UwbAddress>&) override {
+    return ndk::ScopedAStatus::ok();
+  }
+  ndk::ScopedAStatus onControleesRemoveFailed(int32_t, const std::vector<uwb::UwbAddress>&,
+                                              int32_t) override {
+    return ndk::ScopedAStatus::ok();
+  }
+  ndk::ScopedAStatus onSessionStopped(int32_t) override { return ndk::ScopedAStatus::ok(); }
+
+  bool WaitFor(int count) {
+    std::unique_lock<std::mutex> lock(mutex_);
+    return changed_.wait_for(lock, std::chrono::seconds(5), [&] { return results_ >= count; });
+  }
+
+ private:
+  std::mutex mutex_;
+  std::condition_variable changed_;
+  int results_ = 0;
+};
 
 class UwbTest : public ::testing::Test {
  protected:
@@ -192,6 +235,53 @@ TEST_F(UwbTest, ClientDeathClosesTheHal) {
   ndk::host::KillBinder(client->asBinder().get());
   EXPECT_THAT(Names(), IsEmpty());
   EXPECT_TRUE(log.Contains(android::base::INFO, "LambdaOnDeath Uwb service has died", "dalix.Uwb"));
+}
+
+TEST_F(UwbTest, ClientDeathDuringFiraRangingStopsTheRadioAndTheNextClientStartsClean) {
+  AddRadio(0, 0, "wpan0");
+  sim::Peer peer;
+  peer.short_address = 0x1001;
+  peer.motion = sim::Motion::Circle({2, 0, 0}, 1, 1);
+  driver_.world().AddPeer(peer);
+  StartService();
+  tools::FiraOptions options;
+  options.controlees = {peer.short_address};
+  options.block_duration_ms = 20;
+  auto client = ndk::SharedRefBase::make<Client>();
+  ASSERT_TRUE(uwb_->open(client).isOk());
+  std::shared_ptr<uwb::IUwbIface> iface;
+  std::shared_ptr<uwb::IFiraController> fira;
+  ASSERT_TRUE(uwb_->getIface("wpan0", &iface).isOk());
+  ASSERT_TRUE(iface->firaController(&fira).isOk());
+  auto results = ndk::SharedRefBase::make<FiraResults>();
+  ASSERT_TRUE(fira->setSessionCallback(results).isOk());
+  ASSERT_TRUE(fira->initNewTwrSession(tools::RangingClient::MakeFiraSession(options)).isOk());
+  ASSERT_TRUE(fira->startRangingSession(options.session_id).isOk());
+  ASSERT_TRUE(results->WaitFor(3));
+  EXPECT_TRUE(IsUp("wpan0"));
+
+  const std::string dump = tools::DumpService(uwb_->asBinder().get());
+  EXPECT_THAT(dump, ::testing::HasSubstr("UWB HAL: open, client alive, 1 radio(s)"));
+  EXPECT_THAT(dump, ::testing::HasSubstr(
+                        "radio wpan0: hw index 0, phy 0, scheduler endless, interface up"));
+  EXPECT_THAT(dump, ::testing::HasSubstr("FiRa: 1 session(s), 1 running"));
+  EXPECT_THAT(dump, ::testing::ContainsRegex("session 1: running, [0-9]+ notification"));
+
+  ndk::host::KillBinder(client->asBinder().get());
+  EXPECT_THAT(Names(), IsEmpty());
+  EXPECT_FALSE(IsUp("wpan0"));
+  EXPECT_EQ(driver_.radios().Radio(0)->scheduler, kMcpsSchedulerDefault);
+  EXPECT_TRUE(driver_.fira_region().Sessions().empty());
+
+  ASSERT_TRUE(uwb_->open(ndk::SharedRefBase::make<Client>()).isOk());
+  ASSERT_TRUE(uwb_->getIface("wpan0", &iface).isOk());
+  ASSERT_TRUE(iface->firaController(&fira).isOk());
+  int32_t sessions = -1;
+  ASSERT_TRUE(fira->getSessionCount(&sessions).isOk());
+  EXPECT_EQ(sessions, 0);
+  EXPECT_TRUE(fira->initNewTwrSession(tools::RangingClient::MakeFiraSession(options)).isOk());
+  EXPECT_THAT(tools::DumpService(uwb_->asBinder().get()),
+              ::testing::HasSubstr("session 1: initialized, no notification"));
 }
 
 TEST_F(UwbTest, CloseOnAClosedHalOnlyLogsTheInternalClose) {

@@ -2,6 +2,8 @@
 
 #include "uwb.h"
 
+#include <stdio.h>
+
 #include <algorithm>
 #include <utility>
 
@@ -184,6 +186,15 @@ binder_status_t Uwb::dump(int fd, const char** /*args*/, uint32_t /*num_args*/) 
             std::to_string(ifaces_.size()) + " radio(s)\n";
   }
   for (auto& [name, iface] : ifaces_) iface->Dump(&text);
+  // One request list serves the whole driver, whichever radio installed it.
+  const std::vector<uwb::RangingRequest> requests = mcps_utils_->InstalledRangingRequests();
+  text += "simple ranging: " + std::to_string(requests.size()) + " request(s) installed\n";
+  for (const uwb::RangingRequest& request : requests) {
+    char line[96];
+    snprintf(line, sizeof(line), "  request %d: peer %016llx, parameter %d\n", request.id,
+             static_cast<unsigned long long>(request.peerAddress), request.parameter);
+    text += line;
+  }
   return android::base::WriteStringToFd(text, fd) ? STATUS_OK : STATUS_FAILED_TRANSACTION;
 }
 

@@ -45,7 +45,8 @@ class Uwb : public aidl::hardware::dalix::uwb::BnUwb {
   ndk::ScopedAStatus loadCalibration(int64_t hw_index, const std::string& path) override;
   ndk::ScopedAStatus listHardwareIndex(std::vector<int64_t>* hw_indices) override;
   // What dumpsys shows: whether the HAL is open and its client alive, and
-  // each radio (see UwbIface::Dump). Asks the driver for each radio's state.
+  // each radio (see UwbIface::Dump) and the simple ranging requests. Asks the
+  // driver for each radio's state.
   binder_status_t dump(int fd, const char** args, uint32_t num_args) override;
 
   // Stops every radio and forgets the client: close, the death of the

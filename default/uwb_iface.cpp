@@ -87,13 +87,6 @@ void UwbIface::Dump(std::string* out) {
   *out += "  calibration: " + calibration_load_ + "\n";
   *out += "  HAL properties: " + properties_load_ + "\n";
   fira_controller_->Dump(out);
-  const std::vector<uwb::RangingRequest> requests = mcps_utils_->InstalledRangingRequests();
-  *out += "  simple ranging: " + std::to_string(requests.size()) + " request(s)\n";
-  for (const uwb::RangingRequest& request : requests) {
-    snprintf(line, sizeof(line), "    request %d: peer %016llx, parameter %d\n", request.id,
-             static_cast<unsigned long long>(request.peerAddress), request.parameter);
-    *out += line;
-  }
 }
 
 }  // namespace dalix

@@ -49,8 +49,7 @@ class UwbIface : public aidl::hardware::dalix::uwb::BnUwbIface {
   bool LoadHalProperties(const char* path);
 
   // Appends what a dump shows of this radio: its scheduler and up state as
-  // the driver tells them now, the files loaded, the FiRa sessions and the
-  // simple ranging requests.
+  // the driver tells them now, the files loaded and the FiRa sessions.
   void Dump(std::string* out);
 
  private:

@@ -42,8 +42,8 @@ class Writer {
   void U64(int attr, const std::optional<uint64_t>& value) {
     if (value) ok_ = ok_ && nla_put_u64(msg_, attr, *value) == 0;
   }
-  void String(int attr, const std::string& value) {
-    ok_ = ok_ && nla_put_string(msg_, attr, value.c_str()) == 0;
+  void String(int attr, const std::optional<std::string>& value) {
+    if (value) ok_ = ok_ && nla_put_string(msg_, attr, value->c_str()) == 0;
   }
   nlattr* Open(int attr) {
     nlattr* nest = ok_ ? StartPlainNest(msg_, attr) : nullptr;
@@ -104,6 +104,10 @@ bool EncodeFiraNotification(nl_msg* msg, int family_id, const FiraNotificationDa
   nlattr* region_call = writer.Open(MCPS802154_ATTR_SCHEDULER_REGION_CALL);
   writer.String(MCPS802154_REGION_CALL_ATTR_REGION_NAME, data.region);
   writer.U32(MCPS802154_REGION_CALL_ATTR_CALL, data.call);
+  if (!data.has_call_params) {
+    writer.Close(region_call);
+    return writer.ok();
+  }
   nlattr* params = writer.Open(MCPS802154_REGION_CALL_ATTR_CALL_PARAMS);
   writer.U32(FIRA_SESSION_NTF_ATTR_SESSION_ID, data.session_id);
   nlattr* ranging_data = writer.Open(FIRA_SESSION_NTF_ATTR_RANGING_DATA);

@@ -44,8 +44,9 @@ struct FiraMeasurementData {
 struct FiraNotificationData {
   uint8_t cmd = MCPS802154_CMD_CALL_REGION;
   std::optional<uint32_t> hw_index;
-  std::string region = kMcpsRegionFira;
-  uint32_t call = FIRA_CALL_SESSION_NOTIFICATION;
+  std::optional<std::string> region = kMcpsRegionFira;
+  std::optional<uint32_t> call = FIRA_CALL_SESSION_NOTIFICATION;
+  bool has_call_params = true;
   std::optional<uint32_t> session_id;
   // Ranging data: its stopped marker, or a result.
   bool stopped = false;

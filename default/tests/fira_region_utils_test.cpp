@@ -1,0 +1,662 @@
+#include "net/fira_region_utils.h"
+
+#include <unistd.h>
+
+#include <cmath>
+#include <functional>
+#include <map>
+#include <memory>
+#include <set>
+#include <string>
+#include <vector>
+
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+#include <netlink/msg.h>
+
+#include "net/fira_region.h"
+#include "sim/fira_notification.h"
+#include "tests/fira_callback_recorder.h"
+#include "tests/log_capture.h"
+#include "tests/mock_nl_socket.h"
+#include "tests/sent_message.h"
+
+namespace hardware {
+namespace dalix {
+namespace {
+
+using ::android::base::ERROR;
+using ::android::base::INFO;
+using ::android::base::LogSeverity;
+using ::android::base::WARNING;
+using ::testing::_;
+using ::testing::ByMove;
+using ::testing::DoAll;
+using ::testing::Return;
+using ::testing::SaveArg;
+using ::testing::StrictMock;
+namespace uwb = ::aidl::hardware::dalix::uwb;
+using Session = uwb::FiraTwrSession;
+using Attrs = std::map<int, std::vector<uint8_t>>;
+using sim::FiraAoaData;
+using sim::FiraMeasurementData;
+using sim::FiraNotificationData;
+
+constexpr uint32_t kFamily = 0x1d;
+constexpr uint32_t kHw = 3;
+constexpr char kTag[] = "dalix.uwb.FiraRegionUtils";
+
+std::vector<uint8_t> Param(int attr, uint32_t value) {
+  int width = FiraSessionParamWidth(attr);
+  std::vector<uint8_t> bytes = SentMessage::Bytes(value);
+  bytes.resize(width == 0 ? 4 : width);
+  return bytes;
+}
+
+// A driver-controller session (interface value 1) that sets most switches,
+// and what it sends on a radio without antenna properties.
+Session BaseSession() {
+  Session s;
+  s.id = 42;
+  s.deviceType = uwb::DeviceType(1);
+  s.deviceRole = uwb::DeviceRole(1);
+  s.rangingRoundUsage = uwb::RangingRoundUsage(2);
+  s.multiNodeMode = uwb::MultiNodeMode(1);
+  s.deviceAddress = {{0x12, 0x34}};
+  s.destAddressList = {{{0x56, 0x78}}, {{0x9a, 0xbc}}};
+  s.initiationTimeMs = 10;
+  s.slotDurationRstu = 2400;
+  s.slotsPerRangingRound = 25;
+  s.rangingBlockDurationMs = 200;
+  s.blockStridingValue = 3;
+  s.maxRangingRoundRetries = 5;
+  s.isHoppingEnabled = true;
+  s.sessionPriority = 50;
+  s.rangingRoundControl.hasResultReportPhase = true;
+  s.inBandTerminationAttemptCount = 1;
+  s.channelNumber = 9;
+  s.preambleCodeIndex = 10;
+  s.rframeConfig = uwb::RframeConfig(3);
+  s.preambleDuration = uwb::PreambleDuration(1);
+  s.sfdId = 2;
+  s.stsSegmentCount = 1;
+  s.bprfPhrDataRate = uwb::BprfPhrDataRate(1);
+  s.stsConfig = uwb::FiraStsConfig(1);
+  s.subSessionId = 7;
+  s.aoaResultRequest = uwb::AoaResultRequest(1);
+  s.resultReportConfig = {true, true, false, true};
+  return s;
+}
+const std::map<int, uint32_t> kBaseParams = {
+    {1, 0},   {2, 1},   {3, 2},  {4, 1},  {5, 0x1234}, {6, 0x5678}, {7, 10}, {8, 2400},
+    {9, 200}, {10, 25}, {12, 5}, {13, 1}, {15, 50},    {18, 0},     {19, 1}, {20, 9},
+    {21, 10}, {22, 3},  {23, 0}, {25, 2}, {26, 1},     {27, 0},     {28, 1}, {34, 1},
+    {32, 0},  {36, 1},  {43, 1}, {44, 1}, {45, 1},     {47, 1}};
+
+class FiraRegionUtilsTest : public ::testing::Test {
+ protected:
+  void SetUp() override { fira_.SetMcpsNetId(kFamily); }
+  void TearDown() override { nlmsg_set_default_size(getpagesize()); }
+
+  // The next one-shot socket answers one request with |ack| and keeps a copy.
+  void ExpectSocket(bool ack = true) {
+    EXPECT_CALL(factory_, Create()).WillOnce([this, ack] {
+      auto socket = std::make_unique<StrictMock<MockNlSocket>>();
+      EXPECT_CALL(*socket, SendAndAwaitAck(_, _)).WillOnce([this, ack](nl_msg* msg, auto) {
+        sent_.emplace_back(msg);
+        return ack;
+      });
+      return std::unique_ptr<NlSocket>(std::move(socket));
+    });
+  }
+
+  // Checks the framing of the last request; its CALL_PARAMS children.
+  std::vector<nlattr*> CallParams(uint8_t call, uint32_t hw = kHw) {
+    SentMessage& sent = sent_.back();
+    EXPECT_EQ(sent.header()->nlmsg_type, kFamily);
+    EXPECT_EQ(sent.cmd(), MCPS802154_CMD_CALL_REGION);
+    std::vector<nlattr*> top = sent.Attrs();
+    EXPECT_EQ(top.size(), 3u);
+    EXPECT_EQ(SentMessage::Payload(top[0]), SentMessage::Bytes(hw));
+    EXPECT_EQ(SentMessage::Payload(top[1]), SentMessage::StringBytes("endless"));
+    // Plain type words: no NLA_F_NESTED in any FiRa nest.
+    EXPECT_EQ(top[2]->nla_type, MCPS802154_ATTR_SCHEDULER_REGION_CALL);
+    std::vector<nlattr*> region = SentMessage::Children(top[2]);
+    EXPECT_EQ(region.size(), 3u);
+    EXPECT_EQ(SentMessage::Payload(region[0]), SentMessage::StringBytes("fira"));
+    EXPECT_EQ(SentMessage::Payload(region[1]), SentMessage::Bytes<uint32_t>(call));
+    EXPECT_EQ(region[2]->nla_type, MCPS802154_REGION_CALL_ATTR_CALL_PARAMS);
+    return SentMessage::Children(region[2]);
+  }
+
+  int Logged(LogSeverity severity, const std::string& text) {
+    return log_.Count(severity, text, kTag);
+  }
+
+  // Decodes |data| as the ranging socket would; the results it gave.
+  std::vector<std::pair<uwb::FiraRangingData, std::vector<uwb::FiraTwrMeasurement>>> Decode(
+      const FiraNotificationData& data) {
+    UniqueNlMsg msg;
+    EXPECT_TRUE(sim::EncodeFiraNotification(msg.get(), kFamily, data));
+    recorder_.results.clear();
+    EXPECT_EQ(fira_.OnRangingResult(msg.get()), NL_STOP);
+    return recorder_.results;
+  }
+
+  StrictMock<MockNlSocketFactory> factory_;
+  FiraRegionUtils fira_{&factory_};
+  std::vector<SentMessage> sent_;
+  ConfigUtils config_;
+  LogCapture log_;
+  FiraCallbackRecorder recorder_;
+};
+
+TEST_F(FiraRegionUtilsTest, ConfigTwrSessionSendsExactlyTheParametersTheSessionCallsFor) {
+  const struct {
+    const char* name;
+    std::function<void(Session&)> change;
+    std::map<int, int64_t> delta;  // -1: not sent
+    uint32_t hw = kHw;
+  } cases[] = {
+      {"base", [](Session&) {}, {}},
+      {"driver controlee: no destination, its report phases",
+       [](Session& s) {
+         s.deviceType = uwb::DeviceType(0);
+         s.stsConfig = uwb::FiraStsConfig(2);
+         s.rangingRoundControl = {false, uwb::MeasurementReportType(1), true};
+       },
+       {{1, 1}, {6, -1}, {16, 0}, {17, 1}, {18, -1}, {36, 2}}},
+      {"driver controller: no report phases, a sub-session",
+       [](Session& s) {
+         s.stsConfig = uwb::FiraStsConfig(2);
+         s.rangingRoundControl = {false, uwb::MeasurementReportType(1), false};
+       },
+       {{36, 2}, {37, 7}}},
+      {"static STS: IV then vendor id",
+       [](Session& s) {
+         s.stsConfig = uwb::FiraStsConfig(0);
+         s.staticStsIV = {1, 2, 3, 4, 5, 6};
+         s.vendorId = {0xa, 0xb};
+       },
+       {{36, 0}, {38, 0}}},
+      {"block striding", [](Session& s) { s.isBlockStridingEnabled = true; }, {{11, 3}, {14, 1}}},
+      {"no retries", [](Session& s) { s.maxRangingRoundRetries = 0; }, {{12, -1}}},
+      {"negative retries", [](Session& s) { s.maxRangingRoundRetries = -1; }, {{12, -1}}},
+      {"no angles, whatever the type",
+       [](Session& s) {
+         s.aoaResultRequest = uwb::AoaResultRequest(0);
+         s.aoaType = uwb::AoaType(7);
+       },
+       {{43, -1}}},
+      {"elevation", [](Session& s) { s.aoaType = uwb::AoaType(1); }, {{32, -1}, {33, 255}}},
+      {"both in pair mode",
+       [](Session& s) {
+         s.aoaType = uwb::AoaType(2);
+         s.deviceRole = uwb::DeviceRole(0);
+       },
+       {{2, 0}, {33, 255}, {35, 1}}},
+      {"both", [](Session& s) { s.aoaType = uwb::AoaType(2); }, {{33, 255}, {35, 0}}},
+      {"configured hardware",
+       [](Session& s) { s.aoaType = uwb::AoaType(2); },
+       {{32, 2}, {33, 3}, {34, 8}, {35, 0}},
+       kHw + 1},
+      {"other switches",
+       [](Session& s) {
+         s.isKeyRotationEnabled = s.isTxAdaptivePayloadPowerEnabled = true;
+         s.keyRotationRate = 4;
+         s.fcsType = uwb::FcsType(1);
+         s.isHoppingEnabled = false;
+         s.rangingRoundControl.hasDeferredMode = true;
+         s.prfMode = uwb::PrfMode(1);
+         s.preambleDuration = uwb::PreambleDuration(0);
+         s.bprfPhrDataRate = uwb::BprfPhrDataRate(0);
+       },
+       {{41, 1}, {42, 4}, {30, 1}, {29, 1}, {13, -1}, {18, -1}, {23, -1}, {24, 0}, {28, -1}}},
+      {"signed and wide values",
+       [](Session& s) {
+         s.inBandTerminationAttemptCount = -1;
+         s.channelNumber = 0x109;
+         s.sessionPriority = -56;
+       },
+       {{19, 0xffffffff}, {20, 9}, {15, 200}}},
+  };
+  config_.Set("antenna_pair_azimuth", "2");
+  config_.Set("antenna_pair_elevation", "3");
+  config_.Set("tx_antenna", "3");
+  ASSERT_TRUE(fira_.SetProperties(kHw + 1, config_));
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.name);
+    Session session = BaseSession();
+    c.change(session);
+    std::map<int, uint32_t> params = kBaseParams;
+    for (auto [attr, value] : c.delta) {
+      if (value == -1) params.erase(attr);
+      if (value >= 0) params[attr] = static_cast<uint32_t>(value);
+    }
+    Attrs expected;
+    for (auto [attr, value] : params) expected[attr] = Param(attr, value);
+    if (c.delta.count(38)) expected[38] = {1, 2, 3, 4, 5, 6, 0xa, 0xb};
+    ExpectSocket();
+    ASSERT_TRUE(fira_.ConfigTwrSession(c.hw, session));
+    std::vector<nlattr*> call = CallParams(FIRA_CALL_SESSION_SET_PARAMS, c.hw);
+    ASSERT_EQ(call.size(), 2u);
+    EXPECT_EQ(SentMessage::Payload(call[0]), SentMessage::Bytes<uint32_t>(42));
+    Attrs sent;
+    double previous = 0;
+    for (nlattr* attr : SentMessage::Children(call[1])) {
+      // In id order, but for the transmit mask ahead of the other antenna ones.
+      double rank = attr->nla_type == 34 ? 31.5 : attr->nla_type;
+      EXPECT_GT(rank, previous) << attr->nla_type;
+      previous = rank;
+      sent[attr->nla_type] = SentMessage::Payload(attr);
+    }
+    EXPECT_EQ(sent, expected);
+  }
+  ExpectSocket(false);
+  EXPECT_FALSE(fira_.ConfigTwrSession(kHw, BaseSession()));
+}
+
+TEST_F(FiraRegionUtilsTest, ValueChecksRefuseWithTheirLineAndSendNothing) {
+  const std::string bad_address =
+      ": Incorrect deviceAddress size, Fira 1.1 only supports short address.";
+  const std::pair<std::function<void(Session&)>, std::string> cases[] = {
+      {[](Session& s) { s.rangingRoundUsage = uwb::RangingRoundUsage(0); },
+       "PutMainSessionParams: Unsupported rangingRoundUsage OWR"},
+      {[](Session& s) { s.multiNodeMode = uwb::MultiNodeMode(2); },
+       "PutMainSessionParams: Unsupported multiNodeMode MANY_TO_MANY"},
+      {[](Session& s) {
+         s.deviceAddress.address = {1, 2, 3};
+       },
+       "PutMainSessionParams" + bad_address},
+      {[](Session& s) { s.destAddressList[0].address = {1}; },
+       "PutMainSessionParams" + bad_address},
+      {[](Session& s) { s.destAddressList.clear(); }, "PutMainSessionParams" + bad_address},
+      {[](Session& s) { s.rframeConfig = uwb::RframeConfig(2); },
+       "PutRadioParams: Unsupported Rframe config 2"},
+      {[](Session& s) { s.psduDataRate = uwb::PsduDataRate(-1); },
+       "PutRadioParams: Unsupported PSDU data rate -1"},
+      {[](Session& s) { s.aoaType = uwb::AoaType(3); }, "PutAntennaParams: Unsupported AoaType: 3"},
+      {[](Session& s) { s.stsConfig = uwb::FiraStsConfig(3); },
+       "PutCryptoParams: Unsupported STS configuration: 3"},
+  };
+  for (const auto& [change, log] : cases) {
+    Session session = BaseSession();
+    change(session);
+    EXPECT_FALSE(fira_.ConfigTwrSession(kHw, session));
+    EXPECT_EQ(Logged(ERROR, log), 1) << log_.Text();
+    log_.Reset();
+  }
+  EXPECT_FALSE(fira_.AddControlees(kHw, 9, {}, nullptr));
+  EXPECT_FALSE(fira_.RemoveControlees(kHw, 9, {}));
+  EXPECT_FALSE(fira_.AddControlees(kHw, 9, {{{1, 2, 3}}}, nullptr));
+  EXPECT_EQ(Logged(ERROR, "AddControlees: Empty controlees"), 1);
+  EXPECT_EQ(Logged(ERROR, "RemoveControlees: Empty controlees"), 1);
+  EXPECT_EQ(Logged(ERROR, "PutControlees" + bad_address), 1);
+  fira_.SetMcpsNetId(0);
+  EXPECT_FALSE(fira_.InitSession(kHw, 9));
+  EXPECT_EQ(Logged(ERROR, "SetMcpsCommand: MCPS netlink id is not resolved"), 1);
+}
+
+TEST_F(FiraRegionUtilsTest, CallsCarryTheirIdSessionAndParameters) {
+  const std::vector<uwb::UwbAddress> two = {{{0x0a, 0x0b}}, {{0x0c, 0x0d}}};
+  const std::vector<int32_t> subs = {7, -1};
+  const std::vector<uint8_t> add = {20,   0,    1, 0, 6, 0, 1,  0, 0x0b, 0x0a, 0,    0,   8, 0,
+                                    2,    0,    7, 0, 0, 0, 20, 0, 2,    0,    6,    0,   1, 0,
+                                    0x0d, 0x0c, 0, 0, 8, 0, 2,  0, 0xff, 0xff, 0xff, 0xff};
+  const std::vector<uint8_t> remove = {12, 0, 1, 0, 6, 0, 1, 0, 0x0b, 0x0a, 0, 0,
+                                       12, 0, 2, 0, 6, 0, 1, 0, 0x0d, 0x0c, 0, 0};
+  const struct {
+    uint8_t call;
+    std::function<bool()> run;
+    std::vector<uint8_t> second;  // payload of the attribute after the session id
+  } cases[] = {
+      {FIRA_CALL_SESSION_INIT, [&] { return fira_.InitSession(kHw, 9); }, {}},
+      {FIRA_CALL_SESSION_STOP, [&] { return fira_.StopSession(kHw, 9); }, {}},
+      {FIRA_CALL_SESSION_DEINIT, [&] { return fira_.DeinitSession(kHw, 9); }, {}},
+      {FIRA_CALL_SESSION_SET_PARAMS,
+       [&] { return fira_.UpdateBlockStriding(kHw, 9, 0x10203); },
+       {8, 0, FIRA_SESSION_PARAM_ATTR_BLOCK_STRIDING_VALUE, 0, 3, 2, 1, 0}},
+      {FIRA_CALL_NEW_CONTROLEE, [&] { return fira_.AddControlees(kHw, 9, two, &subs); }, add},
+      {FIRA_CALL_DEL_CONTROLEE, [&] { return fira_.RemoveControlees(kHw, 9, two); }, remove},
+  };
+  for (const auto& c : cases) {
+    ExpectSocket();
+    ASSERT_TRUE(c.run());
+    std::vector<nlattr*> params = CallParams(c.call);
+    ASSERT_EQ(params.size(), c.second.empty() ? 1u : 2u) << static_cast<int>(c.call);
+    EXPECT_EQ(SentMessage::Payload(params[0]), SentMessage::Bytes<uint32_t>(9));
+    if (!c.second.empty()) {
+      EXPECT_EQ(SentMessage::Payload(params[1]), c.second);
+    }
+  }
+  ExpectSocket(false);
+  EXPECT_FALSE(fira_.InitSession(kHw, 9));
+}
+
+// Wherever a request runs out of room, it fails with the line of the builder
+// that ran out, and nothing is sent.
+TEST_F(FiraRegionUtilsTest, EveryBuilderReportsRunningOutOfRoom) {
+  const std::vector<uwb::UwbAddress> two = {{{1, 2}}, {{3, 4}}};
+  const std::vector<int32_t> subs = {1, 2};
+  Session session = BaseSession();
+  session.stsConfig = uwb::FiraStsConfig(0);
+  session.isKeyRotationEnabled = true;
+  const std::function<bool()> ops[] = {
+      [&] { return fira_.InitSession(kHw, 1); },
+      [&] { return fira_.ConfigTwrSession(kHw, session); },
+      [&] { return fira_.AddControlees(kHw, 1, two, &subs); },
+      [&] { return fira_.RemoveControlees(kHw, 1, two); },
+      [&] { return fira_.UpdateBlockStriding(kHw, 1, 2); },
+  };
+  for (const auto& op : ops) {
+    ExpectSocket();
+    ASSERT_TRUE(op());
+    for (size_t size = NLMSG_HDRLEN; size < sent_.back().header()->nlmsg_len; size += 4) {
+      nlmsg_set_default_size(size);
+      EXPECT_FALSE(op()) << size;
+    }
+    nlmsg_set_default_size(getpagesize());
+  }
+  std::set<std::string> seen;
+  for (const auto& entry : log_.Entries()) {
+    if (entry.message.find("Error creating") != std::string::npos) seen.insert(entry.message);
+  }
+  std::set<std::string> expected = {"StartCallMessage Error creating MCPS message",
+                                    "PutRadioParams Error creating MCPS message"};
+  for (const char* name :
+       {"SetMcpsCommand", "CreateSessionStateMsg", "ConfigTwrSession", "PutMainSessionParams",
+        "PutShortAddress", "PutTimingsParams", "PutBehaviorParams", "PutAntennaParams",
+        "PutCryptoParams", "PutReportParams", "PutControlees", "AddControlees", "RemoveControlees",
+        "UpdateBlockStriding"}) {
+    expected.insert(std::string(name) + ": Error creating MCPS message");
+  }
+  EXPECT_EQ(seen, expected);
+  // A call nest longer than its 16-bit length can say.
+  nlmsg_set_default_size(1 << 17);
+  EXPECT_FALSE(fira_.AddControlees(kHw, 1, std::vector<uwb::UwbAddress>(5460, {{1, 2}}), nullptr));
+  EXPECT_EQ(Logged(ERROR, "EndCallMessage Error creating MCPS message"), 1);
+}
+
+TEST_F(FiraRegionUtilsTest, SetPropertiesTakesTheLowByteOfValidNumbersOnly) {
+  const struct {
+    const char* values[3];  // azimuth pair, elevation pair, transmit antenna
+    bool valid;
+    uint32_t stored[3];
+  } cases[] = {
+      {{"1", "2", "4"}, true, {1, 2, 4}},           {{"", "0x3", "04"}, true, {0, 3, 4}},
+      {{"257", "6", "0"}, true, {1, 6, 0}},         {{"7", "2x", "5"}, false, {1, 6, 0}},
+      {{nullptr, nullptr, "-1"}, false, {1, 6, 0}}, {{"3", nullptr, nullptr}, false, {3, 6, 0}},
+  };
+  const char* keys[] = {"antenna_pair_azimuth", "antenna_pair_elevation", "tx_antenna"};
+  for (const auto& c : cases) {
+    config_.Clear();
+    for (int i = 0; i < 3; ++i) {
+      if (c.values[i]) config_.Set(keys[i], c.values[i]);
+    }
+    EXPECT_EQ(fira_.SetProperties(kHw, config_), c.valid);
+    FiraRegionUtils::HwConfig stored = fira_.GetHwConfig(kHw).value();
+    EXPECT_EQ((std::vector<uint32_t>{stored.antenna_pair_azimuth, stored.antenna_pair_elevation,
+                                     stored.tx_antenna}),
+              (std::vector<uint32_t>(c.stored, c.stored + 3)));
+  }
+  config_.Clear();
+  EXPECT_FALSE(fira_.SetProperties(kHw + 1, config_));
+  EXPECT_EQ(fira_.GetHwConfig(kHw + 1)->antenna_pair_elevation, 255u);
+}
+
+TEST_F(FiraRegionUtilsTest, StartSessionSharesOneWatchedRangingSocket) {
+  EXPECT_FALSE(fira_.StartSession(kHw, 1));
+  fira_.SubscribeCallback(kHw, nullptr);
+  EXPECT_FALSE(fira_.StartSession(kHw, 1));
+  EXPECT_EQ(Logged(ERROR, "StartSession: Fira callback needs to be set for this hw_index."), 2);
+  fira_.SubscribeCallback(kHw, &recorder_);
+  fira_.SubscribeCallback(kHw + 1, &recorder_);
+  EXPECT_CALL(factory_, Create()).WillOnce(Return(ByMove(nullptr)));
+  EXPECT_FALSE(fira_.StartSession(kHw, 1));
+  EXPECT_EQ(Logged(ERROR, "StartSession: BAD_ALLOC: cannot allocate NlSocket"), 1);
+
+  // A socket that refuses the start, one that cannot be watched, one that works.
+  std::weak_ptr<NlSocket> watched;
+  MockNlSocket* shared = nullptr;
+  for (int attempt = 0; attempt < 3; ++attempt) {
+    auto socket = std::make_unique<StrictMock<MockNlSocket>>();
+    shared = socket.get();
+    EXPECT_CALL(*socket, SendAndAwaitAck(_, _)).WillOnce(Return(attempt > 0));
+    if (attempt > 0) {
+      EXPECT_CALL(*socket, DisableAutoAck());
+      EXPECT_CALL(*socket, WatchNetlinkSocket(_, _))
+          .WillOnce(DoAll(SaveArg<0>(&watched), Return(attempt == 2)));
+    }
+    EXPECT_CALL(factory_, Create()).WillOnce(Return(ByMove(std::move(socket))));
+    EXPECT_EQ(fira_.StartSession(kHw, 1), attempt == 2);
+    EXPECT_EQ(watched.expired(), attempt < 2);
+  }
+  // The second start goes on the same socket; what arrives before its
+  // acknowledgement is a notification.
+  FiraNotificationData early;
+  early.hw_index = kHw + 1;
+  early.session_id = 2;
+  early.stopped = true;
+  UniqueNlMsg notification;
+  ASSERT_TRUE(sim::EncodeFiraNotification(notification.get(), kFamily, early));
+  EXPECT_CALL(*shared, SendAndAwaitAck(_, _))
+      .WillOnce([&](nl_msg*, std::function<int(nl_msg*)> on_message) {
+        EXPECT_EQ(on_message(notification.get()), NL_STOP);
+        return true;
+      });
+  ASSERT_TRUE(fira_.StartSession(kHw + 1, 2));
+  EXPECT_EQ(recorder_.stopped, std::vector<uint32_t>{2});
+
+  fira_.UnsubscribeCallback(kHw);
+  EXPECT_FALSE(watched.expired());
+  fira_.UnsubscribeCallback(kHw + 1);
+  EXPECT_TRUE(watched.expired());
+  fira_.UnsubscribeCallback(kHw + 7);
+  EXPECT_EQ(Logged(INFO, "CloseRangingSocket: Close ranging socket"), 1);
+}
+
+TEST_F(FiraRegionUtilsTest, NotificationsDecodeIntoResultsOrAreDroppedWithTheirLine) {
+  fira_.SubscribeCallback(kHw, &recorder_);
+  config_.Set("antenna_pair_azimuth", "2");
+  config_.Set("antenna_pair_elevation", "3");
+  fira_.SetProperties(kHw, config_);
+  auto peer = [](uint16_t address, std::function<void(FiraMeasurementData&)> change) {
+    FiraMeasurementData m;
+    m.short_address = address;
+    m.status = 0;
+    m.distance_cm = 250;
+    change(m);
+    return m;
+  };
+  auto data = [&](std::vector<FiraMeasurementData> measurements) {
+    FiraNotificationData d;
+    d.hw_index = kHw;
+    d.session_id = 77;
+    d.index = 5;
+    d.timestamp_ns = 123456789;
+    d.measurements = std::move(measurements);
+    return d;
+  };
+  const FiraAoaData aoa = {3, 100, 1, -200};
+  const FiraAoaData unpaired = {4, 1, 2, 3};
+  const FiraAoaData half = {2, 1, 2, std::nullopt};
+  auto batch = Decode(data({
+      peer(0x1234,
+           [&](auto& m) {
+             m.line_of_sight = true;
+             m.azimuth = m.elevation = 32767;
+             m.azimuth_fom = 255;
+             m.elevation_fom = 1;
+             m.aoa_elevation = FiraAoaData{9, 100, 1, -200};
+             m.aoa = aoa;
+           }),
+      peer(2, [](auto& m) { m.line_of_sight = m.non_line_of_sight = true; }),
+      peer(3, [](auto& m) { m.stopped = true; }),
+      peer(4, [](auto& m) { m.status = 2; }),
+      peer(5, [](auto& m) { m.distance_cm.reset(); }),
+      peer(6, [](auto& m) { m.short_address.reset(); }),
+      peer(7, [&](auto& m) { m.aoa_azimuth = half; }),
+      peer(8,
+           [&](auto& m) {
+             m.aoa = unpaired;
+             m.aoa_azimuth = FiraAoaData{std::nullopt, 1, 2, 3};
+           }),
+  }));
+  for (const auto& [severity, text] : std::vector<std::pair<LogSeverity, std::string>>{
+           {INFO, "ParseMeasurements: Stop ranging with peer."},
+           {ERROR, "ParseMeasurements: Missing addr or status in ranging measurement"},
+           {ERROR, "ParseMeasurements: Missing fields in ranging measurement"},
+           {ERROR, "ParseAntennaMeasurement: Missing aoa data measurement fields"}}) {
+    EXPECT_EQ(Logged(severity, text), 1) << text;
+  }
+  ASSERT_EQ(batch.size(), 1u);
+  EXPECT_EQ(batch[0].first.sessionId, 77);
+  EXPECT_EQ(batch[0].first.index, 5);
+  const auto& m = batch[0].second;
+  ASSERT_EQ(m.size(), 5u);
+  EXPECT_EQ(m[0].address.address, (std::vector<uint8_t>{0x34, 0x12}));
+  EXPECT_EQ(m[0].timestampNs, 123456789);
+  EXPECT_EQ(m[0].distance, 250);
+  EXPECT_EQ(m[0].lineOfSight, 1);
+  EXPECT_LT(m[0].azimuthRad, M_PI);
+  EXPECT_GT(m[0].azimuthRad, M_PI - 1e-4);
+  EXPECT_NEAR(m[0].elevationRad, M_PI / 2, 1e-4);
+  EXPECT_EQ(m[0].azimuthFigureOfMerit, 1.0);
+  EXPECT_EQ(m[0].elevationFigureOfMerit, 0.0);
+  // 10 keeps its kind whatever pair it names; 8 names 3, the elevation pair.
+  ASSERT_EQ(m[0].antennaMeasurements.size(), 2u);
+  for (const auto& angle : m[0].antennaMeasurements) {
+    EXPECT_EQ(angle.kind, kFiraAntennaKindElevation);
+    EXPECT_DOUBLE_EQ(angle.firstAngleRad, 100 * kFiraAzimuthScale);
+    EXPECT_DOUBLE_EQ(angle.secondAngleRad, -200 * kFiraAzimuthScale);
+    EXPECT_EQ(angle.figureOfMerit, 0.0);
+  }
+  EXPECT_EQ(m[1].lineOfSight, 0);
+  EXPECT_EQ((std::vector<int>{m[2].status, m[2].distance, m[2].lineOfSight}),
+            (std::vector<int>{2, 0, 0}));
+  EXPECT_EQ(m[3].lineOfSight, -1);
+  EXPECT_TRUE(m[3].antennaMeasurements.empty());
+  // 9 is azimuth data whatever it names; 8 of pair 4 is no pair of this radio.
+  ASSERT_EQ(m[4].antennaMeasurements.size(), 1u);
+  EXPECT_EQ(m[4].antennaMeasurements[0].kind, kFiraAntennaKindAzimuth);
+
+  // Ranging data that is not a result.
+  FiraNotificationData stop = data({peer(1, [](auto&) {})});
+  stop.stopped = true;
+  FiraNotificationData other_hw = data({}), other_call = data({}), no_session = data({}),
+                       no_index = data({}), no_list = data({});
+  other_hw.hw_index = kHw + 1;
+  other_call.call = FIRA_CALL_SESSION_START;
+  no_session.session_id.reset();
+  no_index.index.reset();
+  no_list.measurements.reset();
+  const std::pair<FiraNotificationData, std::string> dropped[] = {
+      {stop, ""},
+      {other_hw, "No callback for hw index: 4"},
+      {other_call, "Not a ranging notification message."},
+      {no_session, "Missing session ntf call attrs"},
+      {no_index, "Missing ranging data attr"},
+      {no_list, "Missing ranging data attr"},
+  };
+  for (const auto& [notification, text] : dropped) {
+    log_.Reset();
+    EXPECT_TRUE(Decode(notification).empty()) << text;
+    if (!text.empty()) {
+      EXPECT_EQ(log_.Entries().back().message, "OnRangingResult: " + text);
+    }
+  }
+  EXPECT_EQ(recorder_.stopped, std::vector<uint32_t>{77});
+}
+
+TEST_F(FiraRegionUtilsTest, MessagesThatAreNotFiraCallsAreRefusedWithTheirLine) {
+  fira_.SubscribeCallback(kHw, &recorder_);
+  // |fill| puts the attributes after the generic netlink header.
+  auto raw = [](std::function<void(nl_msg*)> fill) {
+    auto msg = std::make_shared<UniqueNlMsg>();
+    genlmsg_put(msg->get(), 0, 0, kFamily, 0, 0, MCPS802154_CMD_CALL_REGION, 1);
+    fill(msg->get());
+    return msg;
+  };
+  // A region call whose nest holds what |fill| puts.
+  auto call = [&](std::function<void(nl_msg*)> fill) {
+    return raw([&](nl_msg* m) {
+      nla_put_u32(m, MCPS802154_ATTR_HW, kHw);
+      nlattr* nest = nla_nest_start(m, MCPS802154_ATTR_SCHEDULER_REGION_CALL);
+      fill(m);
+      nla_nest_end(m, nest);
+    });
+  };
+  auto encoded = [](std::function<void(FiraNotificationData&)> change) {
+    FiraNotificationData data;
+    data.hw_index = kHw;
+    change(data);
+    auto msg = std::make_shared<UniqueNlMsg>();
+    sim::EncodeFiraNotification(msg->get(), kFamily, data);
+    return msg;
+  };
+  const struct {
+    std::shared_ptr<UniqueNlMsg> msg;
+    LogSeverity severity;
+    std::string log;
+  } cases[] = {
+      {encoded([](auto& d) { d.cmd = MCPS802154_CMD_RANGING_REPORT; }), WARNING,
+       "Incorrect command received: 13"},
+      {raw([](nl_msg* m) { nlmsg_hdr(m)->nlmsg_len = NLMSG_HDRLEN + 1; }), ERROR,
+       "Message doesn't respect policy"},
+      {raw([](nl_msg* m) { nla_put_u16(m, MCPS802154_ATTR_HW, 1); }), ERROR,
+       "Message doesn't respect policy"},
+      {encoded([](auto& d) { d.hw_index.reset(); }), ERROR,
+       "Missing MCPS802154_ATTR_HW or MCPS802154_ATTR_SCHEDULER_REGION_CALL"},
+      {call([](nl_msg* m) { nla_put_u8(m, MCPS802154_REGION_CALL_ATTR_CALL, 8); }), ERROR,
+       "Incorrect MCPS802154_ATTR_SCHEDULER_REGION_CALL nested message"},
+      {encoded([](auto& d) { d.region = "ccc"; }), ERROR,
+       "Missing Fira region name in mcps message"},
+      {encoded([](auto& d) { d.region.reset(); }), ERROR,
+       "Missing Fira region name in mcps message"},
+      {encoded([](auto& d) { d.call.reset(); }), ERROR, "Missing Fira call in mcps message"},
+      {encoded([](auto& d) { d.has_call_params = false; }), ERROR,
+       "Missing Fira call params in mcps message"},
+  };
+  for (const auto& c : cases) {
+    log_.Reset();
+    uint32_t hw = 0;
+    uint8_t id = 0;
+    EXPECT_EQ(fira_.GetCallContent(c.msg->get(), &hw, &id), nullptr);
+    EXPECT_EQ(Logged(c.severity, "GetCallContent: " + c.log), 1) << log_.Text();
+  }
+  // Attributes of the wrong width further down: the ranging data's index,
+  // one measurement's address, and the other's angle data.
+  for (bool bad_index : {true, false}) {
+    fira_.OnRangingResult(call([&](nl_msg* m) {
+                            nla_put_string(m, MCPS802154_REGION_CALL_ATTR_REGION_NAME, "fira");
+                            nla_put_u32(m, MCPS802154_REGION_CALL_ATTR_CALL, 8);
+                            nlattr* params = nla_nest_start(m, 5);
+                            nla_put_u32(m, FIRA_SESSION_NTF_ATTR_SESSION_ID, 1);
+                            nlattr* data = nla_nest_start(m, FIRA_SESSION_NTF_ATTR_RANGING_DATA);
+                            if (bad_index) nla_put_u16(m, FIRA_RANGING_DATA_ATTR_INDEX, 1);
+                            if (!bad_index) nla_put_u32(m, FIRA_RANGING_DATA_ATTR_INDEX, 1);
+                            nlattr* list = nla_nest_start(m, FIRA_RANGING_DATA_ATTR_MEASUREMENTS);
+                            nlattr* first = nla_nest_start(m, 1);
+                            nla_put_u8(m, FIRA_MEASUREMENT_ATTR_SHORT_ADDR, 1);
+                            nla_nest_end(m, first);
+                            nlattr* second = nla_nest_start(m, 2);
+                            nla_put_u16(m, FIRA_MEASUREMENT_ATTR_SHORT_ADDR, 1);
+                            nla_put_u8(m, FIRA_MEASUREMENT_ATTR_STATUS, 0);
+                            nla_put_u32(m, FIRA_MEASUREMENT_ATTR_DISTANCE, 1);
+                            nlattr* aoa = nla_nest_start(m, FIRA_MEASUREMENT_ATTR_AOA_AZIMUTH);
+                            nla_put_u8(m, FIRA_AOA_ATTR_FIRST_ANGLE, 1);
+                            for (nlattr* nest : {aoa, second, list, data, params}) {
+                              nla_nest_end(m, nest);
+                            }
+                          })->get());
+  }
+  EXPECT_EQ(Logged(WARNING, "OnRangingResult: Failed to parse session ntf call attr"), 1);
+  EXPECT_EQ(Logged(ERROR, "ParseMeasurements: Failed to parse ranging measurement"), 1);
+  EXPECT_EQ(Logged(ERROR, "ParseAntennaMeasurement: Failed to parse aoa data measurement"), 1);
+  ASSERT_EQ(recorder_.results.size(), 1u);
+  EXPECT_EQ(recorder_.results[0].second.size(), 1u);
+}
+
+}  // namespace
+}  // namespace dalix
+}  // namespace hardware

@@ -1,0 +1,245 @@
+#include "sim/fira_region_sim.h"
+
+#include <chrono>
+#include <cmath>
+#include <functional>
+#include <string>
+#include <vector>
+
+#include <gtest/gtest.h>
+
+#include "looper/looper_backed_event_loop.h"
+#include "net/config_utils.h"
+#include "net/fira_region_utils.h"
+#include "net/mcps_utils.h"
+#include "sim/driver_simulator.h"
+#include "sim/mcps_family.h"
+#include "sim/sim_nl_socket_factory.h"
+#include "tests/fira_callback_recorder.h"
+#include "tests/log_capture.h"
+
+namespace hardware {
+namespace dalix {
+namespace sim {
+namespace {
+
+namespace uwb = ::aidl::hardware::dalix::uwb;
+
+constexpr uint16_t kStanding = 0xab01, kCircling = 0xab02, kStopped = 0xab03, kFar = 0xab04;
+
+uwb::UwbAddress Address(uint16_t short_address) {
+  return {{static_cast<uint8_t>(short_address >> 8), static_cast<uint8_t>(short_address)}};
+}
+
+// A session that asks for every angle: both pairs, raw values, confidence.
+uwb::FiraTwrSession AngleSession(int32_t id) {
+  uwb::FiraTwrSession s;
+  s.id = id;
+  s.deviceType = uwb::DeviceType(1);
+  s.deviceRole = uwb::DeviceRole(1);
+  s.rangingRoundUsage = uwb::RangingRoundUsage(2);
+  s.deviceAddress = Address(0x0001);
+  s.destAddressList = {Address(kStanding)};
+  s.slotDurationRstu = 2400;
+  s.slotsPerRangingRound = 6;
+  s.rangingBlockDurationMs = 40;
+  s.channelNumber = 9;
+  s.preambleCodeIndex = 10;
+  s.rframeConfig = uwb::RframeConfig(3);
+  s.stsConfig = uwb::FiraStsConfig(1);
+  s.aoaType = uwb::AoaType(2);
+  s.aoaResultRequest = uwb::AoaResultRequest(1);
+  s.resultReportConfig = {true, true, true, true};
+  return s;
+}
+
+// The service's FiraRegionUtils against the simulated FiRa region, over real
+// sockets and the real event loop.
+class FiraRegionSimTest : public ::testing::Test {
+ protected:
+  void SetUp() override {
+    radios_.AddRadio(0, 0);
+    radios_.AddRadio(1, 1);
+    family_.AttachFiraRegion(&region_);
+    simulator_.RegisterFamily(kMcpsFamilyName, &family_);
+    ASSERT_TRUE(simulator_.Start());
+    ASSERT_TRUE(mcps_.Start());
+    fira_.SetMcpsNetId(mcps_.GetNetId());
+    ASSERT_TRUE(mcps_.SetFiraRegion(0));
+    ASSERT_TRUE(mcps_.SetFiraRegion(1));
+    world_.PlaceRadio(0, {{0, 0, 0}, M_PI / 6, 0.1});
+    world_.AddPeer({kStanding, 1, Motion::Standing({3, 4, 1})});
+    world_.AddPeer({kCircling, 2, Motion::Circle({1, 0, 2}, 2, 1.5)});
+    world_.AddPeer({kStopped, 3, Motion::Standing({1, 1, 0})});
+    world_.AddPeer({kFar, 4, Motion::Line({50, 0, 0}, {1, 0, 0}, 1)});
+    world_.SetLineOfSight(kCircling, false);
+    world_.SetStopped(kStopped, true);
+    world_.SetRangeLimit(40);
+    ConfigUtils antennas;
+    antennas.Set("antenna_pair_azimuth", "1");
+    antennas.Set("antenna_pair_elevation", "2");
+    antennas.Set("tx_antenna", "1");
+    ASSERT_TRUE(fira_.SetProperties(0, antennas));
+    fira_.SubscribeCallback(0, &recorder_);
+    fira_.SubscribeCallback(1, &recorder_);
+  }
+
+  // Serves the ranging socket on this thread until |done| holds or |limit|
+  // has passed, through the looper that the service's loop registered it with.
+  void RunUntil(const std::function<bool()>& done,
+                std::chrono::milliseconds limit = std::chrono::seconds(5)) {
+    android::sp<android::Looper> looper = android::Looper::getForThread();
+    const auto deadline = std::chrono::steady_clock::now() + limit;
+    while (!done() && std::chrono::steady_clock::now() < deadline) looper->pollOnce(100);
+  }
+
+  int NlErrors(int error) {
+    return log_.Count(android::base::WARNING, "SendAndAwaitAck: Nl error: " + std::to_string(error),
+                      "dalix.uwb.NlSocket");
+  }
+
+  World world_;
+  RadioStore radios_;
+  McpsFamily family_{&radios_};
+  FiraRegionSim region_{&simulator_, &radios_, &world_};
+  DriverSimulator simulator_;
+  LooperBackedEventLoop loop_;
+  SimNlSocketFactory factory_{&loop_, simulator_.port()};
+  McpsUtils mcps_{&factory_};
+  FiraRegionUtils fira_{&factory_};
+  FiraCallbackRecorder recorder_;
+  LogCapture log_;
+};
+
+TEST_F(FiraRegionSimTest, SessionRangesTheWorldsPeersUntilStopped) {
+  ASSERT_TRUE(fira_.InitSession(0, 5));
+  ASSERT_TRUE(fira_.ConfigTwrSession(0, AngleSession(5)));
+  const std::vector<int32_t> sub_sessions = {11, 12, 13};
+  ASSERT_TRUE(fira_.AddControlees(0, 5, {Address(kCircling), Address(kStopped), Address(kFar)},
+                                  &sub_sessions));
+  ASSERT_TRUE(fira_.StartSession(0, 5));
+  RunUntil([&] { return recorder_.results.size() >= 3; });
+  ASSERT_GE(recorder_.results.size(), 3u);
+
+  for (size_t round = 0; round < recorder_.results.size(); ++round) {
+    SCOPED_TRACE(round);
+    const auto& [data, measurements] = recorder_.results[round];
+    EXPECT_EQ(data.sessionId, 5);
+    EXPECT_EQ(data.index, static_cast<int32_t>(round));
+    // The stopped peer is left out; the far one failed.
+    ASSERT_EQ(measurements.size(), 3u);
+    EXPECT_EQ(measurements[1].address.address, (std::vector<uint8_t>{0x04, 0xab}));
+    EXPECT_NE(measurements[1].status, 0);
+    for (size_t i : {0, 2}) {
+      const auto& m = measurements[i];
+      const uint16_t peer = i == 0 ? kCircling : kStanding;
+      Observation truth =
+          world_.Truth(0, peer, world_.SecondsAt(static_cast<uint64_t>(m.timestampNs))).value();
+      EXPECT_EQ(m.address.address, (std::vector<uint8_t>{static_cast<uint8_t>(peer), 0xab}));
+      EXPECT_EQ(m.status, 0);
+      EXPECT_NEAR(m.distance, truth.distance_m * 100, 0.5);
+      EXPECT_EQ(m.lineOfSight, peer == kStanding ? 1 : 0);
+      EXPECT_NEAR(m.azimuthRad, truth.azimuth_rad, 1e-4);
+      EXPECT_NEAR(m.elevationRad, truth.elevation_rad, 1e-4);
+      EXPECT_NEAR(m.azimuthFigureOfMerit, peer == kStanding ? 0.9 : 0.4, 0.003);
+      ASSERT_EQ(m.antennaMeasurements.size(), 2u);
+      EXPECT_EQ(m.antennaMeasurements[0].kind, kFiraAntennaKindAzimuth);
+      EXPECT_NEAR(m.antennaMeasurements[0].firstAngleRad, truth.azimuth_rad, 1e-4);
+      EXPECT_NEAR(m.antennaMeasurements[0].secondAngleRad, truth.elevation_rad, 1e-4);
+      EXPECT_EQ(m.antennaMeasurements[1].kind, kFiraAntennaKindElevation);
+      EXPECT_NEAR(m.antennaMeasurements[1].firstAngleRad, truth.elevation_rad, 1e-4);
+    }
+  }
+  EXPECT_GE(log_.Count(android::base::INFO, "ParseMeasurements: Stop ranging with peer."), 3);
+
+  // Everything the session received, as the driver keeps it.
+  SimFiraSession kept = region_.Session(0, 5).value();
+  EXPECT_TRUE(kept.active);
+  EXPECT_EQ(kept.Param(FIRA_SESSION_PARAM_ATTR_DESTINATION_SHORT_ADDR), kStanding);
+  EXPECT_EQ(kept.Param(FIRA_SESSION_PARAM_ATTR_AZIMUTH_ANTENNA_PAIR), 1u);
+  EXPECT_EQ(kept.Param(FIRA_SESSION_PARAM_ATTR_TX_ANTENNA_MASK), 2u);
+  EXPECT_EQ(kept.Param(FIRA_SESSION_PARAM_ATTR_RANGING_BLOCK_DURATION_MS), 40u);
+  EXPECT_EQ(kept.controlees,
+            (std::vector<SimFiraControlee>{{kCircling, 11}, {kStopped, 12}, {kFar, 13}}));
+
+  ASSERT_TRUE(fira_.UpdateBlockStriding(0, 5, 1));
+  ASSERT_TRUE(fira_.RemoveControlees(0, 5, {Address(kStopped)}));
+  ASSERT_TRUE(fira_.StopSession(0, 5));
+  RunUntil([&] { return !recorder_.stopped.empty(); });
+  EXPECT_EQ(recorder_.stopped, std::vector<uint32_t>{5});
+  kept = region_.Session(0, 5).value();
+  EXPECT_FALSE(kept.active);
+  EXPECT_EQ(kept.Param(FIRA_SESSION_PARAM_ATTR_BLOCK_STRIDING_VALUE), 1u);
+  EXPECT_EQ(kept.controlees.size(), 2u);
+  ASSERT_TRUE(fira_.DeinitSession(0, 5));
+  EXPECT_FALSE(region_.Session(0, 5));
+}
+
+TEST_F(FiraRegionSimTest, SessionsOnTwoRadiosShareOneSocketUntilTheLastUnsubscribes) {
+  for (uint32_t hw : {0u, 1u}) {
+    ASSERT_TRUE(fira_.InitSession(hw, 7 + hw));
+    ASSERT_TRUE(fira_.ConfigTwrSession(hw, AngleSession(7 + hw)));
+  }
+  // A notification sent before the first start is acknowledged would come
+  // before libnl takes unsolicited messages on the new socket; from the
+  // second start on, one reaches the callback while the start awaits its
+  // acknowledgement.
+  ASSERT_TRUE(fira_.StartSession(0, 7));
+  region_.SetNotifyOnStart(true);
+  ASSERT_TRUE(fira_.StartSession(1, 8));
+  ASSERT_FALSE(recorder_.results.empty());
+  EXPECT_EQ(recorder_.results.back().first.sessionId, 8);
+  const uint32_t port = region_.Session(0, 7)->port;
+  EXPECT_EQ(region_.Session(1, 8)->port, port);
+
+  fira_.UnsubscribeCallback(0);
+  EXPECT_TRUE(simulator_.SendRaw(port, "x", 1));
+  fira_.UnsubscribeCallback(1);
+  EXPECT_FALSE(simulator_.SendRaw(port, "x", 1));
+}
+
+TEST_F(FiraRegionSimTest, DriverRefusesWhatItCannotDo) {
+  uwb::FiraTwrSession bad_channel = AngleSession(3);
+  bad_channel.channelNumber = 7;
+  const struct {
+    const char* name;
+    std::function<bool()> call;
+    int error;
+  } cases[] = {
+      {"unknown session", [&] { return fira_.StartSession(0, 99); }, -ENOENT},
+      {"session twice", [&] { return fira_.InitSession(0, 3); }, -EBUSY},
+      {"value out of range", [&] { return fira_.ConfigTwrSession(0, bad_channel); }, -EINVAL},
+      {"stop before start", [&] { return fira_.StopSession(0, 3); }, -EINVAL},
+      {"same controlee twice",
+       [&] {
+         return fira_.AddControlees(0, 3, {Address(1), Address(1)}, nullptr);
+       },
+       -EEXIST},
+      {"unknown controlee", [&] { return fira_.RemoveControlees(0, 3, {Address(2)}); }, -ENOENT},
+      {"running: no new parameters",
+       [&] { return fira_.StartSession(0, 3) && fira_.ConfigTwrSession(0, AngleSession(3)); },
+       -EBUSY},
+      {"running: no deinit", [&] { return fira_.DeinitSession(0, 3); }, -EBUSY},
+  };
+  ASSERT_TRUE(fira_.InitSession(0, 3));
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.name);
+    log_.Reset();
+    EXPECT_FALSE(c.call());
+    EXPECT_EQ(NlErrors(c.error), 1) << log_.Text();
+  }
+  // A new scheduler ends the sessions without a word; the region is gone.
+  ASSERT_TRUE(mcps_.SetScheduler(0, McpsScheduler::kDefault, McpsUtils::kNoSlotDuration,
+                                 McpsUtils::kNoNodeType, false));
+  EXPECT_FALSE(region_.Session(0, 3));
+  log_.Reset();
+  EXPECT_FALSE(fira_.InitSession(0, 3));
+  EXPECT_EQ(NlErrors(-EINVAL), 1);
+  RunUntil([] { return false; }, std::chrono::milliseconds(200));
+  EXPECT_TRUE(recorder_.stopped.empty());
+}
+
+}  // namespace
+}  // namespace sim
+}  // namespace dalix
+}  // namespace hardware

@@ -46,10 +46,9 @@ ndk::ScopedAStatus UnknownSession(uint32_t session_id) {
 
 }  // namespace
 
-FiraController::FiraController(std::string name, uint32_t hw_index,
-                               InterfaceTool* interface_tool, McpsUtils* mcps_utils,
-                               IeeeUtils* ieee_utils, FiraRegionUtils* fira_region_utils,
-                               EventLoop* event_loop)
+FiraController::FiraController(std::string name, uint32_t hw_index, InterfaceTool* interface_tool,
+                               McpsUtils* mcps_utils, IeeeUtils* ieee_utils,
+                               FiraRegionUtils* fira_region_utils, EventLoop* event_loop)
     : name_(std::move(name)),
       hw_index_(hw_index),
       interface_tool_(interface_tool),
@@ -272,8 +271,8 @@ ndk::ScopedAStatus FiraController::reset() {
   const McpsHwInfo info = mcps_utils_->GetHardwareInfo(hw_index_, &ok);
   if (!ok) return Unsupported();
   if (info.scheduler != kMcpsSchedulerDefault &&
-      !mcps_utils_->SetScheduler(hw_index_, McpsScheduler::kDefault,
-                                 McpsUtils::kNoSlotDuration, McpsUtils::kNoNodeType, false)) {
+      !mcps_utils_->SetScheduler(hw_index_, McpsScheduler::kDefault, McpsUtils::kNoSlotDuration,
+                                 McpsUtils::kNoNodeType, false)) {
     return Unsupported();
   }
   DropAllSessions();

@@ -45,8 +45,8 @@ class FiraController : public aidl::hardware::dalix::uwb::BnFiraController, publ
   // The driver clients and the loop are borrowed and must outlive the
   // controller. Nothing is sent to the driver until a client calls.
   FiraController(std::string name, uint32_t hw_index, InterfaceTool* interface_tool,
-                 McpsUtils* mcps_utils, IeeeUtils* ieee_utils,
-                 FiraRegionUtils* fira_region_utils, EventLoop* event_loop);
+                 McpsUtils* mcps_utils, IeeeUtils* ieee_utils, FiraRegionUtils* fira_region_utils,
+                 EventLoop* event_loop);
   ~FiraController() override;
   FiraController(const FiraController&) = delete;
   FiraController& operator=(const FiraController&) = delete;
@@ -63,9 +63,9 @@ class FiraController : public aidl::hardware::dalix::uwb::BnFiraController, publ
   ndk::ScopedAStatus startRangingSession(int32_t session_id) override;
   ndk::ScopedAStatus updateTwoWayRangingBlockStriding(int32_t session_id,
                                                       int32_t block_striding_value) override;
-  ndk::ScopedAStatus addControlees(int32_t session_id, const std::vector<UwbAddress>& controlees,
-                                   const std::optional<std::vector<int32_t>>& sub_session_ids)
-      override;
+  ndk::ScopedAStatus addControlees(
+      int32_t session_id, const std::vector<UwbAddress>& controlees,
+      const std::optional<std::vector<int32_t>>& sub_session_ids) override;
   ndk::ScopedAStatus removeControlees(int32_t session_id,
                                       const std::vector<UwbAddress>& controlees) override;
   ndk::ScopedAStatus stopRangingSession(int32_t session_id) override;
@@ -84,6 +84,10 @@ class FiraController : public aidl::hardware::dalix::uwb::BnFiraController, publ
 
   // Hands the radio's HAL properties on to the FiRa region client.
   bool SetProperties(ConfigUtils& config);
+
+  // What the controller believes the driver holds, for diagnostics.
+  const std::map<uint32_t, SessionState>& sessions() const { return sessions_; }
+  uint32_t running_count() const { return running_count_; }
 
   // Refuses a session configuration that the service cannot run; OK or the
   // first failed check's illegal-argument status.

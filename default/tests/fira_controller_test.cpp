@@ -2,14 +2,24 @@
 
 #include <cstdint>
 #include <functional>
+#include <memory>
+#include <set>
 #include <string>
+#include <tuple>
 #include <vector>
 
 #include <android-base/logging.h>
+#include <android-base/strings.h>
+#include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include "net/mcps802154.h"
+#include "tests/fira_client_callback.h"
 #include "tests/fira_session_builder.h"
 #include "tests/log_capture.h"
+#include "tests/mock_driver_clients.h"
+#include "tests/mock_event_loop.h"
+#include "tests/mock_fira_region_utils.h"
 
 namespace hardware {
 namespace dalix {
@@ -19,109 +29,370 @@ using aidl::hardware::dalix::uwb::AoaType;
 using aidl::hardware::dalix::uwb::DeviceType;
 using aidl::hardware::dalix::uwb::FiraStsConfig;
 using aidl::hardware::dalix::uwb::FiraTwrSession;
+using aidl::hardware::dalix::uwb::UwbAddress;
+using ndk::ScopedAStatus;
+using ::testing::_;
+using ::testing::SizeIs;
+using ::testing::StrEq;
+using ::testing::StrictMock;
 
-TEST(CheckTwrSessionFieldsTest, FirstFailedCheckNamesTheField) {
-  using Change = std::function<void(FiraTwrSession&)>;
-  const std::string kStaticSize = "Session with static STS needs to pass vendorId value with size of ";
+constexpr char kTag[] = "dalix.uwb.FiraController";
+constexpr uint32_t kHw = 3;
+
+// Each case changes one field of a valid session (or two, to show that the
+// first failure in check order wins). The session is a controlee's, since
+// the destination check applies whatever the device type.
+#define SET(field, value) [](FiraTwrSession& s) { s.field = value; }
+auto Sts(FiraStsConfig config, size_t vendor_id_size, size_t iv_size) {
+  return [=](FiraTwrSession& s) {
+    std::tie(s.stsConfig, s.vendorId, s.staticStsIV) = std::make_tuple(
+        config, std::vector<uint8_t>(vendor_id_size), std::vector<uint8_t>(iv_size));
+  };
+}
+TEST(CheckTwrSessionFieldsTest, FirstFailedCheckGivesItsMessage) {
+  const std::string kShortOnly = "only short addresses are supported in Fira 1.1";
+  const std::string kStaticSize =
+      "Session with static STS needs to pass vendorId value with size of ";
   const struct {
-    const char* what;
-    Change change;
+    std::function<void(FiraTwrSession&)> change;
     std::string message;  // empty when the session passes
   } cases[] = {
-      {"valid", [](FiraTwrSession&) {}, ""},
-      {"long device address", [](FiraTwrSession& s) { s.deviceAddress.address = {1, 2, 3}; },
-       "deviceAddress has incorrect size, only short addresses are supported in Fira 1.1"},
-      // The address is checked first, so the negative time goes unreported.
-      {"two faults",
-       [](FiraTwrSession& s) {
-         s.deviceAddress.address = {1};
-         s.initiationTimeMs = -1;
-       },
-       "deviceAddress has incorrect size, only short addresses are supported in Fira 1.1"},
-      {"initiation", [](FiraTwrSession& s) { s.initiationTimeMs = -1; },
-       "initiationTimeMs cannot be negative."},
-      {"slot", [](FiraTwrSession& s) { s.slotDurationRstu = -1; },
-       "slotDurationRstu cannot be negative."},
-      {"slots", [](FiraTwrSession& s) { s.slotsPerRangingRound = INT32_MIN; },
-       "slotsPerRangingRound cannot be negative."},
-      {"block", [](FiraTwrSession& s) { s.rangingBlockDurationMs = -1; },
-       "rangingBlockDurationMs cannot be negative."},
-      {"striding", [](FiraTwrSession& s) { s.blockStridingValue = -1; },
-       "blockStridingValue cannot be negative."},
-      {"retries", [](FiraTwrSession& s) { s.maxRangingRoundRetries = -1; },
-       "maxRangingRoundRetries cannot be negative."},
-      {"aoa 2", [](FiraTwrSession& s) { s.aoaType = AoaType::AZIMUTH_AND_ELEVATION; }, ""},
-      {"aoa 3", [](FiraTwrSession& s) { s.aoaType = AoaType(3); }, "Unsupported AoaType: 3"},
-      {"aoa -1", [](FiraTwrSession& s) { s.aoaType = AoaType(-1); }, "Unsupported AoaType: -1"},
-      {"priority 100", [](FiraTwrSession& s) { s.sessionPriority = 100; }, ""},
-      {"priority 101", [](FiraTwrSession& s) { s.sessionPriority = 101; },
-       "Incorrect sessionPriority value 101"},
-      {"priority -1", [](FiraTwrSession& s) { s.sessionPriority = -1; },
-       "Incorrect sessionPriority value 4294967295"},
-      {"attempts 0", [](FiraTwrSession& s) { s.inBandTerminationAttemptCount = 0; },
-       "Incorrect inBandTerminationAttemptCount value 0"},
-      {"attempts 10", [](FiraTwrSession& s) { s.inBandTerminationAttemptCount = 10; }, ""},
-      {"attempts 11", [](FiraTwrSession& s) { s.inBandTerminationAttemptCount = 11; },
-       "Incorrect inBandTerminationAttemptCount value 11"},
-      {"attempts -2", [](FiraTwrSession& s) { s.inBandTerminationAttemptCount = -2; },
+      {SET(deviceAddress.address, std::vector<uint8_t>(8)),
+       "deviceAddress has incorrect size, " + kShortOnly},
+      {SET(initiationTimeMs, (s.deviceAddress.address.pop_back(), -1)),
+       "deviceAddress has incorrect size, " + kShortOnly},
+      {SET(initiationTimeMs, -1), "initiationTimeMs cannot be negative."},
+      {SET(slotDurationRstu, -1), "slotDurationRstu cannot be negative."},
+      {SET(slotsPerRangingRound, INT32_MIN), "slotsPerRangingRound cannot be negative."},
+      {SET(rangingBlockDurationMs, -1), "rangingBlockDurationMs cannot be negative."},
+      {SET(blockStridingValue, -1), "blockStridingValue cannot be negative."},
+      {SET(maxRangingRoundRetries, -1), "maxRangingRoundRetries cannot be negative."},
+      {SET(aoaType, AoaType::AZIMUTH_AND_ELEVATION), ""},
+      {SET(aoaType, AoaType(3)), "Unsupported AoaType: 3"},
+      {SET(aoaType, AoaType(-1)), "Unsupported AoaType: -1"},
+      {SET(sessionPriority, 100), ""},
+      {SET(sessionPriority, 101), "Incorrect sessionPriority value 101"},
+      {SET(sessionPriority, -1), "Incorrect sessionPriority value 4294967295"},
+      {SET(inBandTerminationAttemptCount, 0), "Incorrect inBandTerminationAttemptCount value 0"},
+      {SET(inBandTerminationAttemptCount, 10), ""},
+      {SET(inBandTerminationAttemptCount, 11), "Incorrect inBandTerminationAttemptCount value 11"},
+      {SET(inBandTerminationAttemptCount, -2),
        "Incorrect inBandTerminationAttemptCount value 4294967294"},
-      {"channel 15", [](FiraTwrSession& s) { s.channelNumber = 15; }, ""},
-      {"channel 16", [](FiraTwrSession& s) { s.channelNumber = 16; },
-       "Incorrect channel value 16"},
-      {"channel -1", [](FiraTwrSession& s) { s.channelNumber = -1; },
-       "Incorrect channel value -1"},
-      {"sfd 4", [](FiraTwrSession& s) { s.sfdId = 4; }, ""},
-      {"sfd -3", [](FiraTwrSession& s) { s.sfdId = -3; }, ""},
-      {"sfd 5", [](FiraTwrSession& s) { s.sfdId = 5; }, "Incorrect sfdId value 5"},
-      {"sfd 127", [](FiraTwrSession& s) { s.sfdId = 127; }, "Incorrect sfdId value 127"},
-      // Whatever the device type, and with the controller wording.
-      {"no destination",
-       [](FiraTwrSession& s) {
-         s.deviceType = DeviceType::CONTROLEE;
-         s.destAddressList.clear();
-       },
+      {SET(channelNumber, 15), ""},
+      {SET(channelNumber, 16), "Incorrect channel value 16"},
+      {SET(channelNumber, -1), "Incorrect channel value -1"},
+      {SET(sfdId, 4), ""},
+      {SET(sfdId, -3), ""},
+      {SET(sfdId, 5), "Incorrect sfdId value 5"},
+      {SET(destAddressList, {}),
        "The device is controller of the session, destAddressList should not be empty"},
-      {"bad second destination",
-       [](FiraTwrSession& s) { s.destAddressList.push_back({{1, 2, 3, 4, 5, 6, 7, 8}}); },
-       "destAddressList contains an incorrect address, only short addresses are supported in "
-       "Fira 1.1"},
-      {"static ok",
-       [](FiraTwrSession& s) {
-         s.stsConfig = FiraStsConfig::STATIC;
-         s.vendorId = {1, 2};
-         s.staticStsIV = {1, 2, 3, 4, 5, 6};
-       },
-       ""},
-      {"static no vendor", [](FiraTwrSession& s) { s.stsConfig = FiraStsConfig::STATIC; },
-       kStaticSize + "2"},
-      {"static short iv",
-       [](FiraTwrSession& s) {
-         s.stsConfig = FiraStsConfig::STATIC;
-         s.vendorId = {1, 2};
-         s.staticStsIV = {1, 2, 3, 4, 5};
-       },
-       kStaticSize + "6"},
-      {"dynamic vendor", [](FiraTwrSession& s) { s.vendorId = {1, 2}; },
+      {SET(destAddressList, (std::vector<UwbAddress>{{{0, 2}}, {{1, 2, 3}}})),
+       "destAddressList contains an incorrect address, " + kShortOnly},
+      {Sts(FiraStsConfig::STATIC, 2, 6), ""},
+      {Sts(FiraStsConfig::STATIC, 0, 6), kStaticSize + "2"},
+      {Sts(FiraStsConfig::STATIC, 2, 5), kStaticSize + "6"},
+      {Sts(FiraStsConfig::DYNAMIC, 2, 0),
        "Session without static STS should not pass vendorId value"},
-      {"dynamic iv",
-       [](FiraTwrSession& s) {
-         s.stsConfig = FiraStsConfig::DYNAMIC_FOR_CONTROLEE_INDIVIDUAL_KEY;
-         s.staticStsIV = {1};
-       },
+      {Sts(FiraStsConfig::DYNAMIC_FOR_CONTROLEE_INDIVIDUAL_KEY, 0, 6),
        "Session without static STS should not pass staticStsIV value"},
   };
   for (const auto& c : cases) {
-    SCOPED_TRACE(c.what);
     LogCapture log;
     FiraTwrSession session = ValidFiraSession(1);
+    session.deviceType = DeviceType::CONTROLEE;
     c.change(session);
     const ndk::ScopedAStatus status = FiraController::CheckTwrSessionFields(session);
     EXPECT_EQ(c.message.empty() ? EX_NONE : EX_ILLEGAL_ARGUMENT, status.getExceptionCode());
     EXPECT_EQ(c.message, status.getMessage());
-    EXPECT_TRUE(log.Contains(android::base::INFO, "CheckTwrSessionFields",
-                             "dalix.uwb.FiraController"));
+    EXPECT_TRUE(log.Contains(android::base::INFO, "CheckTwrSessionFields", kTag));
   }
 }
+#undef SET
+
+// One call on the controller, named after the operation it makes.
+struct Op {
+  std::string name;  // empty for the driver's reports, which log nothing
+  std::function<ScopedAStatus(FiraController&)> run;
+};
+
+// The controller on strict mocks that play one radio: its scheduler, its
+// interface flag and the calls a case makes it refuse. Every call that
+// reaches the mocks or the client's callback is logged under a short name
+// (Hw: hardware info, Up?: interface state, Up0/Up1: interface down/up,
+// Fira/Sched: region/default scheduler set, Addr: short address), so that a
+// case states its status, exact traffic, and the sessions and running count
+// it leaves, as one line. The client's callbacks follow the driver's; posted
+// tasks run after "|", once the call returned.
+class FiraControllerTest : public ::testing::Test {
+ protected:
+  enum Begin { kEmpty, kInit, kRun, kRunInit, kInitNoCallback };
+  struct Case {
+    Begin start;
+    Op op;
+    const char* world;  // "!Name" refuses those calls, "@name" sets the scheduler
+    std::string expected;
+  };
+
+  auto Record(const char* name) {
+    return [this, name](uint32_t, uint32_t id, const auto&...) { return Answer(name, id); };
+  }
+
+  void SetUp() override {
+    EXPECT_CALL(mcps_, GetHardwareInfo(kHw, _)).WillRepeatedly([this](uint32_t, bool* ok) {
+      *ok = Answer("Hw");
+      return McpsHwInfo{kHw, 0, scheduler_};
+    });
+    EXPECT_CALL(mcps_, SetFiraRegion(kHw)).WillRepeatedly([this](auto) {
+      return Answer("Fira") && (scheduler_ = kMcpsSchedulerEndless, true);
+    });
+    EXPECT_CALL(mcps_, SetScheduler(kHw, McpsScheduler::kDefault, McpsUtils::kNoSlotDuration,
+                                    McpsUtils::kNoNodeType, false))
+        .WillRepeatedly([this](auto...) {
+          return Answer("Sched") && (scheduler_ = kMcpsSchedulerDefault, true);
+        });
+    EXPECT_CALL(iface_, GetUpState(StrEq("uwb0"))).WillRepeatedly([this](auto) {
+      return Answer("Up?") && up_;
+    });
+    EXPECT_CALL(iface_, SetUpState(StrEq("uwb0"), _)).WillRepeatedly([this](auto, bool up) {
+      return Answer("Up", up) && (up_ = up, true);
+    });
+    EXPECT_CALL(ieee_, SetShortMacAddress(StrEq("uwb0"), std::vector<uint8_t>{0, 1}))
+        .WillRepeatedly([this](auto...) { return Answer("Addr"); });
+    EXPECT_CALL(fira_, SubscribeCallback(kHw, _)).WillRepeatedly([this](auto, FiraCallback* cb) {
+      EXPECT_EQ(static_cast<FiraCallback*>(controller_.get()), cb);
+      Answer("Sub");
+    });
+    EXPECT_CALL(fira_, UnsubscribeCallback(kHw)).WillRepeatedly([this](auto) { Answer("Unsub"); });
+    EXPECT_CALL(fira_, InitSession(kHw, _)).WillRepeatedly(Record("Init"));
+    EXPECT_CALL(fira_, StartSession(kHw, _)).WillRepeatedly(Record("Start"));
+    EXPECT_CALL(fira_, StopSession(kHw, _)).WillRepeatedly(Record("Stop"));
+    EXPECT_CALL(fira_, DeinitSession(kHw, _)).WillRepeatedly(Record("Deinit"));
+    EXPECT_CALL(fira_, RemoveControlees(kHw, _, SizeIs(1))).WillRepeatedly(Record("Del"));
+    EXPECT_CALL(fira_, UpdateBlockStriding(kHw, _, 4)).WillRepeatedly(Record("Stride"));
+    EXPECT_CALL(fira_, ConfigTwrSession(kHw, _)).WillRepeatedly([this](auto, const auto& s) {
+      return Answer("Config", s.id);
+    });
+    EXPECT_CALL(fira_, AddControlees(kHw, _, _, _))
+        .WillRepeatedly([this](auto, uint32_t id, const auto&, const auto* sub_ids) {
+          return Answer(sub_ids == nullptr ? "Add" : "Add+", id);
+        });
+    EXPECT_CALL(loop_, PostTask(_)).WillRepeatedly([this](const std::function<void()>& task) {
+      Answer("Post");
+      tasks_.push_back(task);
+    });
+  }
+
+  bool Answer(const std::string& name, int64_t arg = -1) {
+    calls_.push_back(arg < 0 ? name : name + std::to_string(arg));
+    return refused_.count(name) == 0;
+  }
+
+  // Brings a fresh controller to |start| through its own operations.
+  void Reach(Begin start) {
+    controller_ = ndk::SharedRefBase::make<FiraController>("uwb0", kHw, &iface_, &mcps_, &ieee_,
+                                                           &fira_, &loop_);
+    scheduler_ = kMcpsSchedulerDefault;
+    up_ = true;
+    callback_ = ndk::SharedRefBase::make<FiraClientCallback>();
+    if (start != kInitNoCallback) (void)controller_->setSessionCallback(callback_);
+    if (start != kEmpty) (void)controller_->initNewTwrSession(ValidFiraSession(1));
+    if (start == kRun || start == kRunInit) (void)controller_->startRangingSession(1);
+    if (start == kRunInit) (void)controller_->initNewTwrSession(ValidFiraSession(2));
+  }
+
+  // "<exception> <message>|<traffic>|<sessions as id:state> #<running count>"
+  std::string Outcome(const ScopedAStatus& status) {
+    std::string text = std::to_string(status.getExceptionCode());
+    if (status.getExceptionCode() == EX_SERVICE_SPECIFIC) {
+      text += "/" + std::to_string(status.getServiceSpecificError());
+    }
+    if (*status.getMessage() != '\0') text += std::string(" ") + status.getMessage();
+    text += "|" + android::base::Join(calls_, ' ') + "|";
+    for (const auto& [id, state] : controller_->sessions()) {
+      text += std::to_string(id) + ":" + std::to_string(state) + " ";
+    }
+    return text + "#" + std::to_string(controller_->running_count());
+  }
+
+  void Run(const Case& c) {
+    refused_.clear();
+    Reach(c.start);
+    calls_.clear();
+    tasks_.clear();
+    for (const std::string& token : android::base::Split(c.world, " ")) {
+      if (token[0] == '!') refused_.insert(token.substr(1));
+      if (token[0] == '@') scheduler_ = token.substr(1);
+    }
+    LogCapture log;
+    const ScopedAStatus status = c.op.run(*controller_);
+    const std::vector<std::string> during = callback_->Events();
+    calls_.insert(calls_.end(), during.begin(), during.end());
+    if (!tasks_.empty()) calls_.push_back("|");
+    for (const auto& task : tasks_) task();
+    const std::vector<std::string> after = callback_->Events();
+    calls_.insert(calls_.end(), after.begin() + during.size(), after.end());
+    EXPECT_EQ(c.expected, Outcome(status)) << c.op.name;
+    // Every operation logs its own name before anything else.
+    const std::vector<LogCapture::Entry> lines = log.Entries();
+    if (!c.op.name.empty()) {
+      ASSERT_FALSE(lines.empty());
+      EXPECT_EQ(kTag, lines[0].tag);
+      EXPECT_EQ(c.op.name, lines[0].message.substr(0, c.op.name.size()));
+    }
+    for (const auto& line : lines) {
+      if (line.severity == android::base::ERROR && line.tag == kTag) errors_ += line.message + "\n";
+    }
+  }
+
+  std::vector<std::string> calls_;
+  std::string scheduler_;
+  bool up_ = false;
+  std::set<std::string> refused_;
+  std::vector<std::function<void()>> tasks_;
+  std::string errors_;  // the controller's own ERROR lines, across cases
+  StrictMock<MockMcpsUtils> mcps_;
+  StrictMock<MockInterfaceTool> iface_;
+  StrictMock<MockIeeeUtils> ieee_;
+  StrictMock<MockFiraRegionUtils> fira_;
+  StrictMock<MockEventLoop> loop_;
+  std::shared_ptr<FiraClientCallback> callback_;
+  std::shared_ptr<FiraController> controller_;
+};
+
+// A call of the controller's |method| with the arguments that follow.
+// clang-format off
+#define OP(method, ...) Op{#method, [=](FiraController& c) { return c.method(__VA_ARGS__); }}
+// clang-format on
+
+Op Twice(Op op) {
+  return {op.name, [op](FiraController& c) {
+            (void)op.run(c);
+            return op.run(c);
+          }};
+}
+Op Stopped(uint32_t id) {
+  return {"", [id](FiraController& c) {
+            c.OnSessionStopped(id);
+            return ScopedAStatus::ok();
+          }};
+}
+FiraTwrSession Controlee(int32_t id) {
+  FiraTwrSession session = ValidFiraSession(id);
+  session.deviceType = DeviceType::CONTROLEE;
+  return session;
+}
+
+TEST_F(FiraControllerTest, EveryOperationFromEveryState) {
+  const Op kCapabilities = OP(getCapabilities, nullptr);
+  const std::vector<UwbAddress> kOne = {{{0, 7}}}, kTwo = {{{0, 7}}, {{0, 8}}};
+  int32_t count = -1;
+  const Op kCount = {"getSessionCount",
+                     [&](FiraController& c) { return c.getSessionCount(&count); }};
+  const Op kResult = {"", [](FiraController& c) {
+                        c.OnTwrResult({1, 0}, {});
+                        return ScopedAStatus::ok();
+                      }};
+  const std::string kNoCallback = "-7 You need to register callbacks on the controller first.||";
+  const Case cases[] = {
+      {kRun, kCapabilities, "", "-7||1:1 #1"},
+      // Sessions are created with the region set and the interface down.
+      {kEmpty, OP(initNewTwrSession, ValidFiraSession(1)), "",
+       "0|Hw Up? Up0 Fira Init1 Config1 Up? Addr Add1|1:0 #0"},
+      {kInit, OP(initNewTwrSession, Controlee(2)), "", "0|Hw Init2 Config2 Up? Addr|1:0 2:0 #0"},
+      {kRun, OP(initNewTwrSession, Controlee(1)), "", "-3 Session with id 1 already exist||1:1 #1"},
+      {kEmpty, OP(initNewTwrSession, ValidFiraSession(1, {})), "",
+       "-3 The device is controller of the session, destAddressList should not be empty||#0"},
+      {kEmpty, OP(initNewTwrSession, ValidFiraSession(1)), "!Hw", "-7|Hw|#0"},
+      {kEmpty, OP(initNewTwrSession, ValidFiraSession(1)), "!Fira", "-7|Hw Up? Up0 Fira|#0"},
+      // Failing half-way leaves the driver's session but not the controller's.
+      {kInit, OP(initNewTwrSession, ValidFiraSession(2)), "!Config", "-7|Hw Init2 Config2|1:0 #0"},
+      {kRun, OP(initNewTwrSession, ValidFiraSession(2)), "!Up",
+       "-7|Hw Init2 Config2 Up? Up0|1:1 #1"},
+      {kInit, OP(initNewTwrSession, ValidFiraSession(2)), "!Addr",
+       "-7|Hw Init2 Config2 Up? Addr|1:0 #0"},
+      {kInit, OP(initNewTwrSession, ValidFiraSession(2)), "!Add",
+       "-7|Hw Init2 Config2 Up? Addr Add2|1:0 #0"},
+
+      {kInit, OP(updateTwrSession, ValidFiraSession(1)), "", "0|Hw Config1|1:0 #0"},
+      {kInit, OP(updateTwrSession, ValidFiraSession(1)), "!Config", "-7|Hw Config1|1:0 #0"},
+      {kInit, OP(updateTwrSession, ValidFiraSession(7)), "", "-3 Unknown session id 7||1:0 #0"},
+      {kRun, OP(updateTwrSession, ValidFiraSession(1)), "",
+       "-5 Running session cannot be updated||1:1 #1"},
+      // Someone else changed the scheduler: the driver dropped every session.
+      {kRunInit, OP(updateTwrSession, ValidFiraSession(2)), "@default", "-7|Hw Unsub Up?|#0"},
+
+      {kInit, OP(startRangingSession, 1), "", "0|Hw Up? Up1 Sub Start1|1:1 #1"},
+      {kRunInit, OP(startRangingSession, 2), "", "0|Hw Up? Up1 Start2|1:1 2:1 #2"},
+      {kInitNoCallback, OP(startRangingSession, 9), "", kNoCallback + "1:0 #0"},
+      {kInit, OP(startRangingSession, -1), "", "-3 Unknown session id 4294967295||1:0 #0"},
+      {kRun, OP(startRangingSession, 1), "", "-5 The session is already running||1:1 #1"},
+      {kInit, OP(startRangingSession, 1), "!Hw", "-7|Hw|1:0 #0"},
+      {kInit, OP(startRangingSession, 1), "!Up", "-7|Hw Up? Up1|1:0 #0"},
+      // A refused start is rolled back; the last one unsubscribes.
+      {kInit, OP(startRangingSession, 1), "!Start",
+       "-7|Hw Up? Up1 Sub Start1 Unsub Up? Up0|1:0 #0"},
+      {kRunInit, OP(startRangingSession, 2), "!Start", "-7|Hw Up? Up1 Start2|1:1 2:0 #1"},
+
+      {kRun, OP(updateTwoWayRangingBlockStriding, 1, 4), "", "0|Stride1|1:1 #1"},
+      {kInit, OP(updateTwoWayRangingBlockStriding, 1, 4), "!Stride",
+       "-8/1 Netlink failure|Stride1|1:0 #0"},
+      {kRun, OP(updateTwoWayRangingBlockStriding, 9, -1), "",
+       "-3 Block striding value cannot be negative||1:1 #1"},
+      {kRun, OP(updateTwoWayRangingBlockStriding, 9, 4), "", "-3 Unknown session id 9||1:1 #1"},
+
+      // Controlee outcomes reach the client only after its call returned.
+      {kRun, OP(addControlees, 1, kTwo, std::nullopt), "", "0|Add1 Post | onAdded1|1:1 #1"},
+      {kInit, OP(addControlees, 1, kTwo, std::vector<int32_t>{5, 6}), "!Add+",
+       "0|Add+1 Post | onAddFailed1|1:0 #0"},
+      {kInitNoCallback, OP(addControlees, 1, kTwo, std::nullopt), "", "0|Add1|1:0 #0"},
+      {kInit, OP(addControlees, 2, kTwo, std::nullopt), "", "-3 Unknown session id 2||1:0 #0"},
+      {kInit, OP(addControlees, 1, kTwo, std::vector<int32_t>{5}), "",
+       "-3 Controlees size and sub-session id size do not match||1:0 #0"},
+      {kInit, OP(removeControlees, 1, kOne), "", "0|Del1 Post | onRemoved1|1:0 #0"},
+      {kRun, OP(removeControlees, 1, kOne), "!Del", "0|Del1 Post | onRemoveFailed1|1:1 #1"},
+      {kInitNoCallback, OP(removeControlees, 1, kOne), "!Del", "0|Del1|1:0 #0"},
+      {kInit, OP(removeControlees, 3, kOne), "", "-3 Unknown session id 3||1:0 #0"},
+
+      // The session runs until the driver reports its stop.
+      {kRun, Twice(OP(stopRangingSession, 1)), "", "0|Hw Stop1 Hw Stop1|1:1 #1"},
+      {kRun, OP(stopRangingSession, 1), "!Stop", "-7|Hw Stop1|1:1 #1"},
+      {kRun, OP(stopRangingSession, 2), "", "-3 Unknown session id 2||1:1 #1"},
+      {kRunInit, OP(stopRangingSession, 2), "", "-5 The session isn't started.||1:1 2:0 #1"},
+      {kRun, OP(stopRangingSession, 1), "@simple-ranging", "-7|Hw Unsub Up? Up0|#0"},
+
+      {kRunInit, kCount, "", "0||1:1 2:0 #1"},
+      {kRun, kResult, "", "0|onResult1|1:1 #1"},
+
+      {kRunInit, OP(deinitSession, 2), "", "0|Hw Deinit2|1:1 #1"},
+      {kInit, OP(deinitSession, 1), "!Deinit", "-7|Hw Deinit1|1:0 #0"},
+      {kInit, OP(deinitSession, 2), "", "-3 Unknown session id 2||1:0 #0"},
+      {kRun, OP(deinitSession, 1), "", "-5 The session is started, call stop first.||1:1 #1"},
+      {kInit, OP(deinitSession, 1), "!Hw", "-7|Hw|1:0 #0"},
+      {kRunInit, OP(deinitSession, 2), "@default", "0|Hw Unsub Up?|#0"},
+
+      {kRun, OP(reset), "", "0|Up? Up0 Hw Sched Unsub Up?|#0"},
+      {kEmpty, OP(reset), "@simple-ranging", "0|Up? Up0 Hw Sched Unsub Up?|#0"},
+      {kInit, Twice(OP(reset)), "", "0|Up? Hw Sched Unsub Up? Up? Hw Unsub Up?|#0"},
+      {kRun, OP(reset), "!Up", "-7|Up? Up0|1:1 #1"},
+      {kRun, OP(reset), "!Hw", "-7|Up? Up0 Hw|1:1 #1"},
+      {kInit, OP(reset), "!Sched", "-7|Up? Hw Sched|1:0 #0"},
+
+      {kRunInit, Stopped(1), "", "0|Unsub Up? onStopped1|1:0 2:0 #0"},
+      {kRun, Stopped(1), "!Up", "0|Unsub Up? Up0 onStopped1|1:0 #0"},
+      // Unknown ids are recorded, and the count is not guarded.
+      {kEmpty, Stopped(5), "", "0|onStopped5|5:0 #4294967295"},
+  };
+  for (const Case& c : cases) Run(c);
+  EXPECT_EQ(2, count);
+  EXPECT_EQ(
+      "CheckFiraRegionSet: Fira has been stopped, all session are lost.\n"
+      "startRangingSession: Failed to up iface uwb0\n"
+      "CheckFiraRegionSet: Fira has been stopped, all session are lost.\n"
+      "things gone bad, can't down fira iface\n",
+      errors_);
+}
+
+#undef OP
 
 }  // namespace
 }  // namespace dalix

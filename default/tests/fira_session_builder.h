@@ -28,6 +28,7 @@ inline aidl::hardware::dalix::uwb::FiraTwrSession ValidFiraSession(
   session.rangingBlockDurationMs = 200;
   session.inBandTerminationAttemptCount = 1;
   session.channelNumber = 9;
+  session.preambleCodeIndex = 10;
   session.stsConfig = uwb::FiraStsConfig::DYNAMIC;
   return session;
 }

@@ -12,7 +12,9 @@
 namespace hardware {
 namespace dalix {
 
-// Doubles of the driver clients, for the HAL objects' tests.
+// Doubles of the driver clients, for the HAL objects' tests: the operations
+// the controllers call. The others keep the real behaviour, which needs a
+// socket factory and so must not be reached.
 class MockInterfaceTool : public InterfaceTool {
  public:
   MOCK_METHOD(bool, GetUpState, (const char* iface), (override));
@@ -28,6 +30,7 @@ class MockMcpsUtils : public McpsUtils {
               (uint32_t hw_index, McpsScheduler scheduler, SlotDuration slot_duration,
                NodeType node_type, bool params_only),
               (override));
+  MOCK_METHOD(bool, SetFiraRegion, (uint32_t hw_index), (override));
   MOCK_METHOD(bool, SetRangingRequests,
               (uint32_t hw_index, const std::vector<RangingRequest>& requests), (override));
   MOCK_METHOD(void, SubscribeRangingResults, (RangingResultHandler handler), (override));
@@ -46,6 +49,8 @@ class MockIeeeUtils : public IeeeUtils {
   MOCK_METHOD(bool, SetPanId, (const char* iface, uint16_t pan_id), (override));
   MOCK_METHOD(bool, GetPhyInfo, (const char* iface, PhyInfo* info), (override));
   MOCK_METHOD(bool, SetChannel, (const char* iface, int channel), (override));
+  MOCK_METHOD(bool, SetShortMacAddress, (const char* iface, const std::vector<uint8_t>& address),
+              (override));
 };
 
 class MockCccRegionUtils : public CccRegionUtils {

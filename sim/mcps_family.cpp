@@ -145,8 +145,7 @@ void McpsFamily::HandleRequest(const Request& request, Responder& responder) {
       }
       return;
     default:
-      if (auto handler = command_handlers_.find(request.cmd);
-          handler != command_handlers_.end()) {
+      if (auto handler = command_handlers_.find(request.cmd); handler != command_handlers_.end()) {
         handler->second(request, attrs, responder);
         return;
       }

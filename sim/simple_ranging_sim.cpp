@@ -2,6 +2,8 @@
 
 #include "sim/simple_ranging_sim.h"
 
+#include <time.h>
+
 #include <cerrno>
 #include <chrono>
 #include <cmath>
@@ -17,8 +19,8 @@ namespace dalix {
 namespace sim {
 
 SimpleRangingSim::SimpleRangingSim(DriverSimulator* simulator, RadioStore* radios,
-                                   WpanDeviceStore* devices, PeerAngleSource* peers)
-    : simulator_(simulator), radios_(radios), devices_(devices), peers_(peers) {}
+                                   WpanDeviceStore* devices, World* world)
+    : simulator_(simulator), radios_(radios), devices_(devices), world_(world) {}
 
 int32_t SimpleRangingSim::AngleToPhase(double angle_rad) {
   const double pdoa_rad =
@@ -109,14 +111,7 @@ void SimpleRangingSim::Tick(uint32_t hw_index, uint64_t generation) {
   }
   if (InterfaceUp(hw_index)) {
     for (const Request& request : ranging.requests) {
-      RangingReport report;
-      report.request_id = request.id;
-      // A peer that cannot be reached gets a report without a measurement.
-      if (std::optional<PeerObservation> seen = peers_->Observe(hw_index, request.peer)) {
-        report.measurement = seen->distance_cm;
-        report.pdoa_1 = AngleToPhase(seen->azimuth_rad);
-        report.pdoa_2 = AngleToPhase(seen->elevation_rad);
-      }
+      RangingReport report = Measure(hw_index, request);
       UniqueNlMsg msg = DriverSimulator::NewEvent(ranging.family_id, MCPS802154_CMD_RANGING_REPORT);
       if (!EncodeRangingReport(msg.get(), hw_index, report)) continue;
       if (!simulator_->SendEvent(ranging.port, msg.get())) {
@@ -132,6 +127,23 @@ void SimpleRangingSim::Tick(uint32_t hw_index, uint64_t generation) {
   }
   simulator_->Post([this, hw_index, generation] { Tick(hw_index, generation); },
                    std::chrono::milliseconds(ranging.slot_ms));
+}
+
+RangingReport SimpleRangingSim::Measure(uint32_t hw_index, const Request& request) {
+  RangingReport report;
+  report.request_id = request.id;
+  std::optional<Peer> peer = world_->FindPeerByExtendedAddress(request.peer);
+  if (!peer) return report;
+  timespec now = {};
+  clock_gettime(CLOCK_MONOTONIC, &now);
+  const uint64_t now_ns = static_cast<uint64_t>(now.tv_sec) * 1000000000u + now.tv_nsec;
+  std::optional<Observation> seen =
+      world_->Measure(hw_index, peer->short_address, world_->SecondsAt(now_ns));
+  if (!seen || !seen->in_range || seen->stopped) return report;
+  report.measurement = static_cast<uint32_t>(std::lround(seen->distance_m * 100));  // cm
+  report.pdoa_1 = AngleToPhase(seen->azimuth_rad);
+  report.pdoa_2 = AngleToPhase(seen->elevation_rad);
+  return report;
 }
 
 bool SimpleRangingSim::InterfaceUp(uint32_t hw_index) const {

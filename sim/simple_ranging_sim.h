@@ -10,9 +10,9 @@
 #include <netlink/msg.h>
 
 #include "sim/driver_simulator.h"
-#include "sim/peer_angle_source.h"
 #include "sim/radio_store.h"
 #include "sim/responder.h"
+#include "sim/world.h"
 #include "sim/wpan_device_store.h"
 
 namespace hardware {
@@ -31,10 +31,11 @@ struct RangingReport {
 // The simulated driver's simple ranging: SET_RANGING_REQUESTS on a radio that
 // runs the "simple-ranging" scheduler, then one RANGING_REPORT per request
 // each slot period, sent to the port that installed the list, while the
-// radio's interface is up. Peers are observed through a PeerAngleSource, and
-// angles go out as the phase differences that the service turns back into
-// angles. Runs on the simulator thread; the installed lists may be read from
-// any thread.
+// radio's interface is up. Each report measures the peer in the World (by
+// its extended address), its angles sent as the phase differences that the
+// service turns back into angles; a peer unknown, out of range or stopped
+// gets a report without a measurement. Runs on the simulator thread; the installed lists may be
+// read from any thread.
 class SimpleRangingSim {
  public:
   // One installed request, as received.
@@ -44,10 +45,9 @@ class SimpleRangingSim {
     uint64_t peer = 0;
   };
 
-  // The stores and the source are borrowed; |devices| may be null (every
-  // radio counts as up).
+  // All borrowed; |devices| may be null (every radio counts as up).
   SimpleRangingSim(DriverSimulator* simulator, RadioStore* radios, WpanDeviceStore* devices,
-                   PeerAngleSource* peers);
+                   World* world);
 
   // Handles MCPS802154_CMD_SET_RANGING_REQUESTS; |attrs| parsed at top level.
   void SetRangingRequests(const sim::Request& request, nlattr** attrs, Responder& responder);
@@ -73,12 +73,13 @@ class SimpleRangingSim {
   };
 
   void Tick(uint32_t hw_index, uint64_t generation);
+  RangingReport Measure(uint32_t hw_index, const Request& request);
   bool InterfaceUp(uint32_t hw_index) const;
 
   DriverSimulator* const simulator_;
   RadioStore* const radios_;
   WpanDeviceStore* const devices_;
-  PeerAngleSource* const peers_;
+  World* const world_;
   mutable std::mutex mutex_;
   std::map<uint32_t, Ranging> ranging_;
   int reports_sent_ = 0;

@@ -292,8 +292,7 @@ bool McpsUtils::SetCalibration(uint32_t hw_index, ConfigUtils* config) {
   return !skipped && status == 0;
 }
 
-bool McpsUtils::SetRangingRequests(uint32_t hw_index,
-                                   const std::vector<RangingRequest>& requests) {
+bool McpsUtils::SetRangingRequests(uint32_t hw_index, const std::vector<RangingRequest>& requests) {
   LOG(INFO) << __func__;
   if (!ranging_handler_) {
     LOG(WARNING) << __func__ << ": The ranging result handler needs to be set first";
@@ -312,9 +311,8 @@ bool McpsUtils::SetRangingRequests(uint32_t hw_index,
   if (!socket->SendAndAwaitAck(msg.get(), nullptr)) return false;
   // Reports come unasked, with sequence 0: nothing to acknowledge or match.
   socket->DisableAutoAck();
-  if (!socket->WatchNetlinkSocket(socket, [this](nl_msg* report) {
-        return OnRangingResult(report);
-      })) {
+  if (!socket->WatchNetlinkSocket(socket,
+                                  [this](nl_msg* report) { return OnRangingResult(report); })) {
     return false;
   }
   ranging_socket_ = std::move(socket);
@@ -352,8 +350,7 @@ int McpsUtils::OnRangingResult(nl_msg* msg) {
   if (ranging_requests_.empty() || !ranging_handler_) return NL_STOP;
 
   nlattr* attrs[MCPS802154_ATTR_MAX + 1] = {};
-  if (genlmsg_parse(header, 0, attrs, MCPS802154_ATTR_MAX,
-                    kMcpsRangingReportPolicy.data()) != 0) {
+  if (genlmsg_parse(header, 0, attrs, MCPS802154_ATTR_MAX, kMcpsRangingReportPolicy.data()) != 0) {
     LOG(WARNING) << __func__ << ": Failed to parse attr";
     return NL_STOP;
   }
@@ -387,7 +384,8 @@ int McpsUtils::OnRangingResult(nl_msg* msg) {
   result.peerAddress = request->peerAddress;
   result.measurement = value_or_absent(MCPS802154_RANGING_RESULT_ATTR_MEASUREMENT, false);
   result.firstAngleRad = phase_to_rad(value_or_absent(MCPS802154_RANGING_RESULT_ATTR_PDOA_1, true));
-  result.secondAngleRad = phase_to_rad(value_or_absent(MCPS802154_RANGING_RESULT_ATTR_PDOA_2, true));
+  result.secondAngleRad =
+      phase_to_rad(value_or_absent(MCPS802154_RANGING_RESULT_ATTR_PDOA_2, true));
   ranging_handler_(result);
   return NL_STOP;
 }

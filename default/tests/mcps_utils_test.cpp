@@ -38,8 +38,8 @@ using ::testing::_;
 using ::testing::AnyNumber;
 using ::testing::ByMove;
 using ::testing::DoAll;
-using ::testing::SaveArg;
 using ::testing::Return;
+using ::testing::SaveArg;
 using ::testing::StrEq;
 using ::testing::StrictMock;
 
@@ -49,7 +49,8 @@ constexpr char kTag[] = "dalix.uwb.McpsUtils";
 
 // The driver client and the HAL objects must name the same request and result
 // types, with both headers in one translation unit.
-static_assert(std::is_same_v<McpsUtils::RangingRequest, aidl::hardware::dalix::uwb::RangingRequest>);
+static_assert(
+    std::is_same_v<McpsUtils::RangingRequest, aidl::hardware::dalix::uwb::RangingRequest>);
 static_assert(std::is_same_v<McpsUtils::RangingResult, aidl::hardware::dalix::uwb::RangingResult>);
 
 class McpsUtilsTest : public ::testing::Test {
@@ -287,8 +288,7 @@ double ExpectedAngle(std::optional<int32_t> phase) {
 }
 
 TEST_F(McpsUtilsTest, RequestsAreSentInOrderAndPhasesComeBackAsAngles) {
-  Install({Request(7, -2, 0x0102030405060708),
-           Request(9, 5, -1)});
+  Install({Request(7, -2, 0x0102030405060708), Request(9, 5, -1)});
   ASSERT_EQ(sent_.size(), 1u);
   EXPECT_EQ(sent_[0].cmd(), MCPS802154_CMD_SET_RANGING_REQUESTS);
   std::vector<nlattr*> attrs = sent_[0].Attrs();
@@ -298,14 +298,15 @@ TEST_F(McpsUtilsTest, RequestsAreSentInOrderAndPhasesComeBackAsAngles) {
   std::vector<std::vector<uint8_t>> fields;
   for (nlattr* element : SentMessage::Children(attrs[1])) {
     EXPECT_EQ(element->nla_type, MCPS802154_RANGING_REQUESTS_ATTR_REQUEST | NLA_F_NESTED);
-    for (nlattr* field : SentMessage::Children(element)) fields.push_back(SentMessage::Payload(field));
+    for (nlattr* field : SentMessage::Children(element))
+      fields.push_back(SentMessage::Payload(field));
   }
   EXPECT_EQ(fields, (std::vector<std::vector<uint8_t>>{
                         SentMessage::Bytes(7), SentMessage::Bytes(-2),
                         SentMessage::Bytes(int64_t{0x0102030405060708}), SentMessage::Bytes(9),
                         SentMessage::Bytes(5), SentMessage::Bytes(int64_t{-1})}));
 
-  const std::optional<int32_t> phases[] = {0,     1000,  -1000, 5805,         5806,
+  const std::optional<int32_t> phases[] = {0,     1000,   -1000,  5805,        5806,
                                            32767, -32767, -32768, std::nullopt};
   for (std::optional<int32_t> phase : phases) {
     SCOPED_TRACE(phase.value_or(0));
@@ -328,13 +329,20 @@ TEST_F(McpsUtilsTest, RequestsAreSentInOrderAndPhasesComeBackAsAngles) {
 }
 
 TEST_F(McpsUtilsTest, ReportsReachTheFirstRequestOfTheirIdOnly) {
-  Install({Request(1, 0, 10),
-           Request(1, 0, 11),
-           Request(2, 0, 12)});
+  Install({Request(1, 0, 10), Request(1, 0, 11), Request(2, 0, 12)});
   Deliver({1u, 5u, 0, 0});
   Deliver({8u, 5u, 0, 0});
   Deliver({1u, 5u, 0, 0}, MCPS802154_CMD_NEW_HW);
   Deliver({std::nullopt, 5u, 0, 0});
+  // A phase shorter than its 4 bytes is refused, not read past.
+  UniqueNlMsg short_phase = sim::DriverSimulator::NewEvent(kFamily, MCPS802154_CMD_RANGING_REPORT);
+  nla_put_u32(short_phase.get(), MCPS802154_ATTR_HW, kHw);
+  nlattr* result = nla_nest_start(short_phase.get(), MCPS802154_ATTR_RANGING_RESULT);
+  nla_put_u32(short_phase.get(), MCPS802154_RANGING_RESULT_ATTR_REQUEST_ID, 1);
+  nla_put_u16(short_phase.get(), MCPS802154_RANGING_RESULT_ATTR_PDOA_2, 7);
+  nla_nest_end(short_phase.get(), result);
+  on_report_(short_phase.get());
+  EXPECT_EQ(log_.Count(WARNING, "OnRangingResult: Failed to parse nested attr", kTag), 1);
   ASSERT_EQ(results_.size(), 1u);
   EXPECT_EQ(results_[0].peerAddress, 10);
   EXPECT_EQ(log_.Count(WARNING, "OnRangingResult: Received result for unknown request", kTag), 1);

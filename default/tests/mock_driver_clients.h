@@ -1,8 +1,12 @@
 #pragma once
 
+#include <functional>
 #include <string>
+#include <vector>
 
+#include <android/binder_auto_utils.h>
 #include <gmock/gmock.h>
+#include <gtest/gtest.h>
 
 #include "net/ccc_region_utils.h"
 #include "net/ieee_utils.h"
@@ -36,13 +40,6 @@ class MockMcpsUtils : public McpsUtils {
   MOCK_METHOD(void, SubscribeRangingResults, (RangingResultHandler handler), (override));
 };
 
-// A GetHardwareInfo answer: the exchange's verdict and the radio's scheduler.
-inline auto HardwareInfo(bool ok, const std::string& scheduler = "default") {
-  McpsHwInfo info;
-  info.scheduler = scheduler;
-  return ::testing::DoAll(::testing::SetArgPointee<1>(ok), ::testing::Return(info));
-}
-
 class MockIeeeUtils : public IeeeUtils {
  public:
   MockIeeeUtils() : IeeeUtils(nullptr) {}
@@ -60,6 +57,52 @@ class MockCccRegionUtils : public CccRegionUtils {
               (uint32_t hw_index, uint32_t first, uint64_t timeref, uint8_t channel,
                uint32_t* u32_param),
               (override));
+};
+
+class DriverClientsTest : public ::testing::Test {
+ protected:
+  using Step = std::function<void()>;
+  static constexpr uint32_t kHw = 4;
+  static constexpr char kIface[] = "wpan4";
+
+  // Expects the listed driver calls in this order, runs |call| and checks the
+  // status it ends with. EX_TRANSACTION_FAILED stands for the plain
+  // STATUS_UNKNOWN_ERROR.
+  void Run(const std::vector<Step>& steps, const std::function<ndk::ScopedAStatus()>& call,
+           binder_exception_t exception, const char* message = "") {
+    ::testing::InSequence in_order;
+    for (const Step& step : steps) step();
+    ndk::ScopedAStatus status = call();
+    EXPECT_EQ(status.getExceptionCode(), exception);
+    EXPECT_STREQ(status.getMessage(), message);
+    EXPECT_EQ(status.getStatus(),
+              exception == EX_TRANSACTION_FAILED ? STATUS_UNKNOWN_ERROR : STATUS_OK);
+    ::testing::Mock::VerifyAndClearExpectations(&mcps_);
+  }
+
+  Step Hw(bool ok, const char* scheduler = "default") {
+    McpsHwInfo info;
+    info.scheduler = scheduler;
+    return [=] {
+      EXPECT_CALL(mcps_, GetHardwareInfo(kHw, ::testing::_))
+          .WillOnce(::testing::DoAll(::testing::SetArgPointee<1>(ok), ::testing::Return(info)));
+    };
+  }
+  Step IsUp(bool up) {
+    return [=] {
+      EXPECT_CALL(tool_, GetUpState(::testing::StrEq(kIface))).WillOnce(::testing::Return(up));
+    };
+  }
+  Step Up(bool up, bool ok) {
+    return [=] {
+      EXPECT_CALL(tool_, SetUpState(::testing::StrEq(kIface), up)).WillOnce(::testing::Return(ok));
+    };
+  }
+
+  ::testing::StrictMock<MockInterfaceTool> tool_;
+  ::testing::StrictMock<MockMcpsUtils> mcps_;
+  ::testing::StrictMock<MockIeeeUtils> ieee_;
+  ::testing::StrictMock<MockCccRegionUtils> ccc_;
 };
 
 }  // namespace dalix

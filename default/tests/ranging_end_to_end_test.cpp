@@ -13,6 +13,7 @@
 #include <map>
 #include <mutex>
 #include <thread>
+#include <tuple>
 #include <vector>
 
 #include <gtest/gtest.h>
@@ -28,6 +29,7 @@
 #include "sim/sim_interface_tool.h"
 #include "sim/sim_nl_socket_factory.h"
 #include "sim/simple_ranging_sim.h"
+#include "sim/world.h"
 #include "simple_ranging_controller.h"
 #include "tests/log_capture.h"
 
@@ -41,56 +43,52 @@ constexpr uint32_t kHw = 0;
 constexpr char kIface[] = "wpan0";
 constexpr int64_t kPeerA = 0x0a0a, kPeerB = 0x0b0b, kNobody = 0x0f0f;
 
-// Peers at fixed places: distance (cm), azimuth and elevation (rad).
-class FixedPeers : public sim::PeerAngleSource {
- public:
-  std::optional<sim::PeerObservation> Observe(uint32_t, uint64_t peer) override {
-    if (peer == kPeerA) return sim::PeerObservation{250, 0.5, -0.25};
-    if (peer == kPeerB) return sim::PeerObservation{800, -1.0, 0.1};
-    return std::nullopt;
-  }
-};
+// A peer standing |distance_m| away in the direction of |azimuth| and
+// |elevation| from a radio at the origin looking along x.
+sim::Peer StandingPeer(uint16_t short_address, int64_t extended, double distance_m, double azimuth,
+                       double elevation) {
+  sim::Peer peer;
+  peer.short_address = short_address;
+  peer.extended_address = static_cast<uint64_t>(extended);
+  peer.motion = sim::Motion::Standing({distance_m * cos(elevation) * cos(azimuth),
+                                       distance_m * cos(elevation) * sin(azimuth),
+                                       distance_m * sin(elevation)});
+  return peer;
+}
 
+// Keeps each request's first result; counts them all.
 class RecordingCallback : public uwb::BnSimpleRangingCallback {
  public:
   ndk::ScopedAStatus onRangingResult(const uwb::RangingResult& result) override {
     std::lock_guard<std::mutex> lock(mutex_);
-    results_[result.id].push_back(result);
+    first_.emplace(result.id, result);
+    ++count_;
     changed_.notify_all();
     return ndk::ScopedAStatus::ok();
   }
-  int Count() {
-    std::lock_guard<std::mutex> lock(mutex_);
-    int count = 0;
-    for (const auto& [id, results] : results_) count += static_cast<int>(results.size());
-    return count;
-  }
-  // The first result of each of |ids|, once every one has come.
-  std::map<int32_t, uwb::RangingResult> WaitForEach(const std::vector<int32_t>& ids) {
+  std::map<int32_t, uwb::RangingResult> WaitForFirst(size_t requests) {
     std::unique_lock<std::mutex> lock(mutex_);
-    std::map<int32_t, uwb::RangingResult> first;
-    changed_.wait_for(lock, std::chrono::seconds(5), [&] {
-      for (int32_t id : ids) {
-        if (results_[id].empty()) return false;
-      }
-      return true;
-    });
-    for (int32_t id : ids) {
-      if (!results_[id].empty()) first[id] = results_[id].front();
-    }
-    return first;
+    changed_.wait_for(lock, std::chrono::seconds(5), [&] { return first_.size() == requests; });
+    return first_;
+  }
+  int count() {
+    std::lock_guard<std::mutex> lock(mutex_);
+    return count_;
   }
 
  private:
   std::mutex mutex_;
   std::condition_variable changed_;
-  std::map<int32_t, std::vector<uwb::RangingResult>> results_;
+  std::map<int32_t, uwb::RangingResult> first_;
+  int count_ = 0;
 };
 
 class RangingEndToEndTest : public ::testing::Test {
  protected:
   void SetUp() override {
     radios_.AddRadio(kHw, 0u);
+    world_.AddPeer(StandingPeer(0xa, kPeerA, 2.5, 0.5, -0.25));
+    world_.AddPeer(StandingPeer(0xb, kPeerB, 8.0, -1.0, 0.1));
     std::string error;
     ASSERT_TRUE(devices_.AddDevice({kIface, 0}, &error)) << error;
     mcps_family_.SetCommandHandler(MCPS802154_CMD_SET_RANGING_REQUESTS,
@@ -151,11 +149,11 @@ class RangingEndToEndTest : public ::testing::Test {
 
   sim::RadioStore radios_;
   sim::WpanDeviceStore devices_;
-  FixedPeers peers_;
+  sim::World world_;
   sim::McpsFamily mcps_family_{&radios_};
   sim::Nl802154Family nl802154_family_{&devices_};
   sim::DriverSimulator simulator_;
-  sim::SimpleRangingSim ranging_{&simulator_, &radios_, &devices_, &peers_};
+  sim::SimpleRangingSim ranging_{&simulator_, &radios_, &devices_, &world_};
   sim::CccTestModeSim test_mode_{&radios_};
   std::thread service_;
   std::atomic<LooperBackedEventLoop*> loop_ = nullptr;
@@ -188,20 +186,16 @@ TEST_F(RangingEndToEndTest, BothModesDeliverTheAnglesOfTheSimulatedPeers) {
 
     ASSERT_TRUE(
         simple_->setRangings({Request(1, kPeerA), Request(2, kPeerB), Request(3, kNobody)}).isOk());
-    std::map<int32_t, uwb::RangingResult> first = callback->WaitForEach({1, 2, 3});
+    std::map<int32_t, uwb::RangingResult> first = callback->WaitForFirst(3);
     ASSERT_EQ(first.size(), 3u);
     // One fixed-point step of phase is about 2e-4 rad of angle near the axis.
-    const struct {
-      int32_t id;
-      int64_t peer;
-      int32_t distance;
-      double azimuth, elevation;
-    } expected[] = {{1, kPeerA, 250, 0.5, -0.25}, {2, kPeerB, 800, -1.0, 0.1}};
-    for (const auto& e : expected) {
-      EXPECT_EQ(first[e.id].peerAddress, e.peer);
-      EXPECT_EQ(first[e.id].measurement, e.distance);
-      EXPECT_NEAR(first[e.id].firstAngleRad, e.azimuth, 1e-3);
-      EXPECT_NEAR(first[e.id].secondAngleRad, e.elevation, 1e-3);
+    for (auto [id, peer, short_address] :
+         {std::tuple(1, kPeerA, 0xa), std::tuple(2, kPeerB, 0xb)}) {
+      sim::Observation truth = *world_.Truth(kHw, short_address, 0);
+      EXPECT_EQ(first[id].peerAddress, peer);
+      EXPECT_EQ(first[id].measurement, std::lround(truth.distance_m * 100));
+      EXPECT_NEAR(first[id].firstAngleRad, truth.azimuth_rad, 1e-3);
+      EXPECT_NEAR(first[id].secondAngleRad, truth.elevation_rad, 1e-3);
     }
     // A peer out of reach: reported, but nothing measured.
     EXPECT_EQ(first[3].measurement, INT32_MIN);
@@ -210,9 +204,9 @@ TEST_F(RangingEndToEndTest, BothModesDeliverTheAnglesOfTheSimulatedPeers) {
     ASSERT_TRUE(simple_->stop().isOk());
     EXPECT_FALSE(devices_.FindByName(kIface)->up);
     // The reports end with the ranging socket: nothing more reaches the client.
-    const int delivered = callback->Count();
+    const int delivered = callback->count();
     std::this_thread::sleep_for(std::chrono::milliseconds(100));
-    EXPECT_EQ(callback->Count(), delivered);
+    EXPECT_EQ(callback->count(), delivered);
   }
 }
 

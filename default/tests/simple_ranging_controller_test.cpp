@@ -2,7 +2,6 @@
 
 #include <functional>
 #include <memory>
-#include <string>
 #include <vector>
 
 #include <gmock/gmock.h>
@@ -16,178 +15,94 @@ namespace {
 
 using ::testing::_;
 using ::testing::DoAll;
-using ::testing::InSequence;
+using ::testing::IsEmpty;
 using ::testing::Return;
 using ::testing::SetArgPointee;
 using ::testing::StrEq;
-using ::testing::StrictMock;
 
-constexpr uint32_t kHw = 4;
-constexpr char kIface[] = "wpan4";
-constexpr int64_t kAddress = 0x0102030405060708;
-constexpr InterfaceTool::MacAddress kMac = {1, 2, 3, 4, 5, 6, 7, 8};
+constexpr auto kUnknown = EX_TRANSACTION_FAILED;
 
-// What a call ends with: OK, an exception with its message, or the plain
-// unknown-error status (exception EX_TRANSACTION_FAILED).
-struct Outcome {
-  binder_exception_t exception;
-  const char* message;
-};
-constexpr Outcome kOk = {EX_NONE, ""};
-constexpr Outcome kUnknownError = {EX_TRANSACTION_FAILED, ""};
-
-class SimpleRangingControllerTest : public ::testing::Test {
+class SimpleRangingControllerTest : public DriverClientsTest {
  protected:
-  void Check(const ndk::ScopedAStatus& status, const Outcome& expected) {
-    EXPECT_EQ(status.getExceptionCode(), expected.exception);
-    EXPECT_STREQ(status.getMessage(), expected.message);
-    if (expected.exception == EX_TRANSACTION_FAILED) {
-      EXPECT_EQ(status.getStatus(), STATUS_UNKNOWN_ERROR);
-    }
+  Step Phy(bool ok) {
+    return [=] {
+      EXPECT_CALL(ieee_, GetPhyInfo(StrEq(kIface), _))
+          .WillOnce(DoAll(SetArgPointee<1>(PhyInfo{0, {5, 9}}), Return(ok)));
+    };
+  }
+  Step Requests(size_t count, bool ok) {
+    return [=] {
+      EXPECT_CALL(mcps_, SetRangingRequests(kHw, ::testing::SizeIs(count))).WillOnce(Return(ok));
+    };
   }
 
-  StrictMock<MockInterfaceTool> tool_;
-  StrictMock<MockMcpsUtils> mcps_;
-  StrictMock<MockIeeeUtils> ieee_;
   std::shared_ptr<SimpleRangingController> controller_ =
       ndk::SharedRefBase::make<SimpleRangingController>(kIface, kHw, &tool_, &mcps_, &ieee_);
 };
 
 TEST_F(SimpleRangingControllerTest, StartEndsAtTheFirstFailingStep) {
-  enum Step { kDown, kScheduler, kMacAddress, kPanId, kPhy, kChannel, kUp };
-  // Each case runs the steps up to |last|, which answers |last_ok|.
-  const struct {
-    Step last;
-    bool last_ok;
-    bool responder;
-    int32_t channel;
-    Outcome outcome;
-  } cases[] = {
-      {kUp, true, false, 9, kOk},
-      {kUp, true, true, 5, kOk},
-      {kDown, false, false, 9, kUnknownError},
-      {kScheduler, false, true, 9, kUnknownError},
-      {kMacAddress, false, false, 9, kUnknownError},
-      {kPanId, false, false, 9, kUnknownError},
-      {kPhy, false, false, 9, {EX_ILLEGAL_ARGUMENT, "Incorrect channel value"}},
-      {kPhy, true, false, 6, {EX_ILLEGAL_ARGUMENT, "Incorrect channel value"}},
-      {kChannel, false, false, 9, kUnknownError},
-      {kUp, false, true, 9, kUnknownError},
-  };
-  for (const auto& c : cases) {
-    SCOPED_TRACE(testing::Message() << "last step " << c.last << ", channel " << c.channel);
-    const std::function<void(bool)> steps[] = {
-        [&](bool ok) { EXPECT_CALL(tool_, SetUpState(StrEq(kIface), false)).WillOnce(Return(ok)); },
-        [&](bool ok) {
-          EXPECT_CALL(mcps_,
-                      SetScheduler(
-                          kHw, McpsScheduler::kSimpleRanging, McpsUtils::kSimpleRangingSlotDuration,
-                          c.responder ? McpsUtils::kResponder : McpsUtils::kInitiator, false))
-              .WillOnce(Return(ok));
-        },
-        [&](bool ok) {
-          EXPECT_CALL(tool_, SetMacAddress(StrEq(kIface), kMac)).WillOnce(Return(ok));
-        },
-        // The PAN id is narrowed to 16 bits.
-        [&](bool ok) { EXPECT_CALL(ieee_, SetPanId(StrEq(kIface), 0x1234)).WillOnce(Return(ok)); },
-        [&](bool ok) {
-          EXPECT_CALL(ieee_, GetPhyInfo(StrEq(kIface), _))
-              .WillOnce(DoAll(SetArgPointee<1>(PhyInfo{0, {5, 9}}), Return(ok)));
-        },
-        [&](bool ok) {
-          EXPECT_CALL(ieee_, SetChannel(StrEq(kIface), c.channel)).WillOnce(Return(ok));
-        },
-        [&](bool ok) { EXPECT_CALL(tool_, SetUpState(StrEq(kIface), true)).WillOnce(Return(ok)); },
+  for (bool responder : {false, true}) {
+    // The steps in order, the i-th failing when |fail| is i; 7 runs them all.
+    auto steps = [&](int fail, int32_t channel) {
+      std::vector<Step> all = {
+          Up(false, fail != 0),
+          [=] {
+            EXPECT_CALL(
+                mcps_,
+                SetScheduler(kHw, McpsScheduler::kSimpleRanging,
+                             McpsUtils::kSimpleRangingSlotDuration,
+                             responder ? McpsUtils::kResponder : McpsUtils::kInitiator, false))
+                .WillOnce(Return(fail != 1));
+          },
+          [=] {
+            EXPECT_CALL(tool_, SetMacAddress(StrEq(kIface),
+                                             InterfaceTool::MacAddress{1, 2, 3, 4, 5, 6, 7, 8}))
+                .WillOnce(Return(fail != 2));
+          },
+          // The PAN id is narrowed to 16 bits.
+          [=] { EXPECT_CALL(ieee_, SetPanId(StrEq(kIface), 0x1234)).WillOnce(Return(fail != 3)); },
+          Phy(fail != 4),
+          [=] {
+            EXPECT_CALL(ieee_, SetChannel(StrEq(kIface), channel)).WillOnce(Return(fail != 5));
+          },
+          Up(true, fail != 6)};
+      all.resize(channel == 6 ? 5 : std::min(fail + 1, 7));
+      return all;
     };
-    InSequence in_order;
-    for (int step = kDown; step <= c.last; ++step) steps[step](step < c.last || c.last_ok);
-    Check(c.responder ? controller_->startResponderMode(0x51234, kAddress, c.channel)
-                      : controller_->startInitiatorMode(0x51234, kAddress, c.channel),
-          c.outcome);
-    testing::Mock::VerifyAndClearExpectations(&tool_);
-    testing::Mock::VerifyAndClearExpectations(&mcps_);
-    testing::Mock::VerifyAndClearExpectations(&ieee_);
+    auto start = [&](int32_t channel) {
+      return [=] {
+        return responder ? controller_->startResponderMode(0x51234, 0x0102030405060708, channel)
+                         : controller_->startInitiatorMode(0x51234, 0x0102030405060708, channel);
+      };
+    };
+    for (int fail : {0, 1, 2, 3, 5, 6}) Run(steps(fail, 9), start(9), kUnknown);
+    Run(steps(4, 9), start(9), EX_ILLEGAL_ARGUMENT, "Incorrect channel value");
+    Run(steps(7, 6), start(6), EX_ILLEGAL_ARGUMENT, "Incorrect channel value");
+    Run(steps(7, 5), start(5), EX_NONE);
   }
 }
 
 TEST_F(SimpleRangingControllerTest, RangingsStopAndCapabilitiesAnswerAsTheDriverAllows) {
   const std::vector<SimpleRangingController::RangingRequest> thirteen(13), fourteen(14);
-  std::vector<int32_t> channels;
-  const struct {
-    const char* name;
-    std::function<void()> expect;
-    std::function<ndk::ScopedAStatus()> call;
-    Outcome outcome;
-  } cases[] = {
-      {"setRangings while down",
-       [&] { EXPECT_CALL(tool_, GetUpState(StrEq(kIface))).WillOnce(Return(false)); },
-       [&] { return controller_->setRangings(thirteen); },
-       {EX_ILLEGAL_STATE, "Interface is not running"}},
-      {"setRangings of 14",
-       [&] { EXPECT_CALL(tool_, GetUpState(StrEq(kIface))).WillOnce(Return(true)); },
-       [&] { return controller_->setRangings(fourteen); },
-       {EX_ILLEGAL_ARGUMENT, "Max ranging request size is 14"}},
-      {"setRangings of 13",
-       [&] {
-         EXPECT_CALL(tool_, GetUpState(StrEq(kIface))).WillOnce(Return(true));
-         EXPECT_CALL(mcps_, SetRangingRequests(kHw, thirteen)).WillOnce(Return(true));
-       },
-       [&] { return controller_->setRangings(thirteen); }, kOk},
-      {"setRangings refused",
-       [&] {
-         EXPECT_CALL(tool_, GetUpState(StrEq(kIface))).WillOnce(Return(true));
-         EXPECT_CALL(mcps_, SetRangingRequests(kHw, thirteen)).WillOnce(Return(false));
-       },
-       [&] { return controller_->setRangings(thirteen); }, kUnknownError},
-      {"stop without the radio",
-       [&] { EXPECT_CALL(mcps_, GetHardwareInfo(kHw, _)).WillOnce(HardwareInfo(false)); },
-       [&] { return controller_->stop(); },
-       {EX_ILLEGAL_STATE, ""}},
-      {"stop refused",
-       [&] {
-         EXPECT_CALL(mcps_, GetHardwareInfo(kHw, _)).WillOnce(HardwareInfo(true));
-         EXPECT_CALL(mcps_, SetRangingRequests(kHw, testing::IsEmpty())).WillOnce(Return(false));
-       },
-       [&] { return controller_->stop(); },
-       {EX_ILLEGAL_STATE, ""}},
-      {"stop",
-       [&] {
-         EXPECT_CALL(mcps_, GetHardwareInfo(kHw, _)).WillOnce(HardwareInfo(true));
-         EXPECT_CALL(mcps_, SetRangingRequests(kHw, testing::IsEmpty())).WillOnce(Return(true));
-         // Whether the interface went down does not matter.
-         EXPECT_CALL(tool_, SetUpState(StrEq(kIface), false)).WillOnce(Return(false));
-       },
-       [&] { return controller_->stop(); }, kOk},
-      {"capabilities unreadable",
-       [&] { EXPECT_CALL(ieee_, GetPhyInfo(StrEq(kIface), _)).WillOnce(Return(false)); },
-       [&] {
-         SimpleRangingController::UwbCapabilities capabilities;
-         return controller_->getCapabilities(&capabilities);
-       },
-       kUnknownError},
-      {"capabilities",
-       [&] {
-         EXPECT_CALL(ieee_, GetPhyInfo(StrEq(kIface), _))
-             .WillOnce(DoAll(SetArgPointee<1>(PhyInfo{0, {5, 9}}), Return(true)));
-       },
-       [&] {
-         SimpleRangingController::UwbCapabilities capabilities;
-         ndk::ScopedAStatus status = controller_->getCapabilities(&capabilities);
-         channels = capabilities.supportedChannels;
-         return status;
-       },
-       kOk},
-      {"null callback",
-       [] {},
-       [&] { return controller_->setCallback(nullptr); },
-       {EX_ILLEGAL_ARGUMENT, "null client"}},
-  };
-  for (const auto& c : cases) {
-    SCOPED_TRACE(c.name);
-    c.expect();
-    Check(c.call(), c.outcome);
-  }
-  EXPECT_EQ(channels, (std::vector<int32_t>{5, 9}));
+  auto set = [&](const auto& list) { return [&] { return controller_->setRangings(list); }; };
+  auto stop = [&] { return controller_->stop(); };
+  SimpleRangingController::UwbCapabilities capabilities;
+  auto get = [&] { return controller_->getCapabilities(&capabilities); };
+
+  Run({IsUp(false)}, set(thirteen), EX_ILLEGAL_STATE, "Interface is not running");
+  Run({IsUp(true)}, set(fourteen), EX_ILLEGAL_ARGUMENT, "Max ranging request size is 14");
+  Run({IsUp(true), Requests(13, true)}, set(thirteen), EX_NONE);
+  Run({IsUp(true), Requests(13, false)}, set(thirteen), kUnknown);
+  Run({Hw(false)}, stop, EX_ILLEGAL_STATE);
+  Run({Hw(true), Requests(0, false)}, stop, EX_ILLEGAL_STATE);
+  // Whether the interface went down does not matter.
+  Run({Hw(true), Requests(0, true), Up(false, false)}, stop, EX_NONE);
+  Run({Phy(false)}, get, kUnknown);
+  EXPECT_THAT(capabilities.supportedChannels, IsEmpty());
+  Run({Phy(true)}, get, EX_NONE);
+  EXPECT_EQ(capabilities.supportedChannels, (std::vector<int32_t>{5, 9}));
+  Run(
+      {}, [&] { return controller_->setCallback(nullptr); }, EX_ILLEGAL_ARGUMENT, "null client");
 }
 
 }  // namespace

@@ -1,0 +1,22 @@
+// The CCC test-mode reply handler on arbitrary replies (see
+// fuzz/generic_message.h for the input's form).
+
+#include <cstddef>
+#include <cstdint>
+
+#include "fuzz/generic_message.h"
+#include "fuzz/scripted_driver.h"
+#include "net/ccc_region_utils.h"
+
+extern "C" int LLVMFuzzerInitialize(int* /*argc*/, char*** /*argv*/) {
+  hardware::dalix::fuzz::SilenceLogs();
+  return 0;
+}
+
+extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
+  hardware::dalix::UniqueNlMsg msg;
+  if (hardware::dalix::fuzz::FrameGenericMessage(data, size, 0x1a, &msg)) {
+    hardware::dalix::CccRegionUtils::ParseTestModeCmdResponse(msg.get());
+  }
+  return 0;
+}

@@ -1,0 +1,42 @@
+#pragma once
+
+// Structure-aware framing for the fuzz targets of mcps802154 parsers: the
+// first input byte is the generic netlink command, the rest the attribute
+// stream, so that mutations reach the attribute parsers instead of dying at
+// the headers. Seeds are written in the same form.
+
+#include <stddef.h>
+#include <stdint.h>
+
+#include <vector>
+
+#include <netlink/genl/genl.h>
+#include <netlink/msg.h>
+
+#include "net/unique_nl_msg.h"
+
+namespace hardware {
+namespace dalix {
+namespace fuzz {
+
+// Puts |data| into the empty |msg| as libnl would deliver it: nlmsg_len
+// covers exactly the headers and the attribute stream. False when there is
+// no command byte or the input is larger than a page.
+inline bool FrameGenericMessage(const uint8_t* data, size_t size, int family, UniqueNlMsg* msg) {
+  if (size == 0 || size > 4096) return false;
+  if (genlmsg_put(msg->get(), 0, 0, family, 0, 0, data[0], 0) == nullptr) return false;
+  return size == 1 || nlmsg_append(msg->get(), const_cast<uint8_t*>(data + 1), size - 1, 1) == 0;
+}
+
+// The seed form of an encoded message: its command, then its attributes.
+inline std::vector<uint8_t> SeedOf(nl_msg* msg) {
+  genlmsghdr* genl = genlmsg_hdr(nlmsg_hdr(msg));
+  const auto* attrs = reinterpret_cast<const uint8_t*>(genlmsg_attrdata(genl, 0));
+  std::vector<uint8_t> seed = {genl->cmd};
+  seed.insert(seed.end(), attrs, attrs + genlmsg_attrlen(genl, 0));
+  return seed;
+}
+
+}  // namespace fuzz
+}  // namespace dalix
+}  // namespace hardware

@@ -34,12 +34,12 @@ void InitLogger() {
 }
 
 int SetupBinderOrCrash() {
+  CHECK(BinderPollingAvailable())
+      << "libbinder_ndk does not export ABinderProcess_setupPolling and "
+         "ABinderProcess_handlePolledCommands";
   // No binder threads: every transaction is drained by the event loop, on
   // the one thread the service has.
   ABinderProcess_setThreadPoolMaxThreadCount(0);
-  CHECK(BinderPollingAvailable())
-      << "Binder polling is not available to this process: ABinderProcess_setupPolling or "
-         "ABinderProcess_handlePolledCommands did not resolve";
   int binder_fd = -1;
   binder_status_t status = ABinderProcess_setupPolling(&binder_fd);
   CHECK_EQ(status, STATUS_OK);

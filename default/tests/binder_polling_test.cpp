@@ -2,17 +2,8 @@
 
 #include <gtest/gtest.h>
 
-namespace hardware {
-namespace dalix {
-namespace {
-
-// Built twice: linked with the binder library, where both calls resolve, and
-// without it, where the weak declarations stay null as they do against the
-// vendor link stub on a device whose library lacks them.
+// Built with the binder library and without any (where the weak
+// declarations stay null, as on a device whose library lacks the calls).
 TEST(BinderPollingTest, AvailableExactlyWhenBothCallsResolved) {
-  EXPECT_EQ(DALIX_BINDER_LINKED != 0, BinderPollingAvailable());
+  EXPECT_EQ(DALIX_BINDER_LINKED != 0, hardware::dalix::BinderPollingAvailable());
 }
-
-}  // namespace
-}  // namespace dalix
-}  // namespace hardware

@@ -1,6 +1,10 @@
 #include <poll.h>
 
 #include <atomic>
+#include <cstring>
+#include <iterator>
+#include <tuple>
+#include <utility>
 #include <functional>
 #include <memory>
 #include <string>
@@ -14,6 +18,7 @@
 #include <android/binder_manager.h>
 #include <android/binder_process.h>
 #include <binder_host/host.h>
+#include <binder_host/parcel_check.h>
 #include <gtest/gtest.h>
 
 namespace {
@@ -43,16 +48,14 @@ class TestUwb : public uwb::BnUwb {
     return Ran(ScopedAStatus::ok());
   }
   ScopedAStatus listIfaceNames(std::vector<std::string>* names) override {
-    *names = {"uwb0", "uwb1"};
+    *names = iface_names;
     return Ran(ScopedAStatus::ok());
   }
   ScopedAStatus getIface(const std::string&, std::shared_ptr<uwb::IUwbIface>* out) override {
     *out = iface;
     return Ran(ScopedAStatus::ok());
   }
-  ScopedAStatus close() override {
-    return Ran(ScopedAStatus::fromServiceSpecificErrorWithMessage(1, "Netlink failure"));
-  }
+  ScopedAStatus close() override { return Ran(close_status()); }
   ScopedAStatus loadCalibration(int64_t hw_index, const std::string& path) override {
     const std::string message = std::to_string(hw_index) + ":" + path;
     return Ran(ScopedAStatus::fromExceptionCodeWithMessage(EX_ILLEGAL_ARGUMENT, message.c_str()));
@@ -68,6 +71,10 @@ class TestUwb : public uwb::BnUwb {
   }
 
   std::vector<std::thread::id> callers;
+  std::vector<std::string> iface_names = {"uwb0", "uwb1"};
+  ScopedAStatus (*close_status)() = [] {
+    return ScopedAStatus::fromServiceSpecificErrorWithMessage(1, "Netlink failure");
+  };
   std::shared_ptr<uwb::IUwbClientCallback> client;
   std::shared_ptr<TestIface> iface = ndk::SharedRefBase::make<TestIface>();
 };
@@ -152,6 +159,56 @@ TEST_F(InterfaceTest, ClientCallsRunOnTheServiceThreadWithTheirResults) {
   EXPECT_NE(std::static_pointer_cast<uwb::IUwbIface>(service_->iface), iface);
   EXPECT_EQ(service_->iface->asBinder(), iface->asBinder());
   EXPECT_EQ(EX_UNSUPPORTED_OPERATION, s[8].getExceptionCode());
+}
+
+// What a real process boundary refuses or strips, the emulated one does too.
+TEST_F(InterfaceTest, CallsFailAsTheyWouldCrossingAProcessBoundary) {
+  // Request: token header, descriptor, int64, then the path's length, its
+  // UTF-16 characters and terminator.
+  const size_t fixed = 12 + 4 + (std::strlen(uwb::IUwb::descriptor) + 1) * 2 + 8 + 4 + 2;
+  const size_t fits = (ndk::host::ParcelCheck::kMaxTransactionBytes - fixed) / 2 - 1;
+  const std::pair<std::string, binder_status_t> paths[] = {
+      {"caf\xc3\xa9 \xf0\x9f\x93\xa1", STATUS_OK},  {"stray \x80", STATUS_BAD_VALUE},
+      {"truncated \xe2\x82", STATUS_BAD_VALUE},         {"overlong \xc0\xaf", STATUS_BAD_VALUE},
+      {"surrogate \xed\xa0\x80", STATUS_BAD_VALUE},    {std::string(fits, 'a'), STATUS_OK},
+      {std::string(fits + 2, 'a'), STATUS_FAILED_TRANSACTION},
+  };
+  // Answers of close(): exception, transport status and message as the caller sees them.
+  const std::tuple<ScopedAStatus (*)(), binder_exception_t, binder_status_t, const char*>
+      answers[] = {
+          {[] { return ScopedAStatus::fromExceptionCodeWithMessage(EX_TRANSACTION_FAILED, "x"); },
+           EX_TRANSACTION_FAILED, STATUS_FAILED_TRANSACTION, ""},
+          {[] { return ScopedAStatus::fromStatus(STATUS_NO_MEMORY); }, EX_TRANSACTION_FAILED,
+           STATUS_NO_MEMORY, ""},
+      };
+  service_->iface_names = {"uwb0", "\xff"};
+  std::vector<ScopedAStatus> results;
+  std::vector<std::string> names = {"kept"};
+  RunClient([&] {
+    std::shared_ptr<uwb::IUwb> proxy = Lookup(instance_);
+    for (const auto& [path, _] : paths) results.push_back(proxy->loadCalibration(1, path));
+    for (const auto& answer : answers) {
+      service_->close_status = std::get<0>(answer);  // read while this thread waits
+      results.push_back(proxy->close());
+    }
+    results.push_back(proxy->listIfaceNames(&names));
+  });
+  ASSERT_EQ(std::size(paths) + std::size(answers) + 1, results.size());
+  size_t i = 0;
+  for (const auto& [path, refused_with] : paths) {
+    // A refused request fails without reaching the service, which would
+    // answer EX_ILLEGAL_ARGUMENT.
+    SCOPED_TRACE(path.substr(0, 20));
+    EXPECT_EQ(refused_with, results[i].getStatus());
+    EXPECT_EQ(refused_with == STATUS_OK, results[i++].getExceptionCode() == EX_ILLEGAL_ARGUMENT);
+  }
+  for (const auto& [_, exception, transport, message] : answers) {
+    EXPECT_EQ(exception, results[i].getExceptionCode());
+    EXPECT_EQ(transport, results[i].getStatus());
+    EXPECT_STREQ(message, results[i++].getMessage());
+  }
+  EXPECT_EQ(STATUS_BAD_VALUE, results[i].getStatus()) << "a reply that cannot be written";
+  EXPECT_EQ(std::vector<std::string>{"kept"}, names);
 }
 
 }  // namespace

@@ -1,6 +1,5 @@
-// IX::version is declared in the generated header only, as the platform's
-// generator leaves it: reading its value is fine, taking its address (an ODR
-// use) must fail to link. Built by cmake/compile_fail.cmake.
+// IX::version has no definition, as on the platform: reading it builds,
+// taking its address must not link (cmake/compile_fail.cmake).
 #include <cstdio>
 
 #include <aidl/aidl/hardware/dalix/uwb/IUwb.h>

@@ -1,38 +1,30 @@
 // What the platform's binder headers refuse, one case per DALIX_CASE value
-// (see cmake/compile_fail.cmake); case 0 is the same code done right.
+// (cmake/compile_fail.cmake); case 0 is the same code done right.
 #include <memory>
 #include <type_traits>
+#include <utility>
 
 #include <android/binder_auto_utils.h>
-#include <android/binder_ibinder.h>
-#include <android/binder_interface_utils.h>
 #include <android/binder_manager.h>
-#include <android/binder_status.h>
 #include <binder_host/host.h>
 
 namespace {
 
 class IThing : public ndk::ICInterface {};
-
 class Thing : public ndk::BnCInterface<IThing> {
- public:
 #if DALIX_CASE == 1
   ndk::SpAIBinder asBinder() override { return nullptr; }
 #elif DALIX_CASE == 2
   bool isRemote() override { return true; }
 #endif
-
- protected:
   ndk::SpAIBinder createBinder() override {
     return ndk::host::NewLocalBinder("test.IThing", ref<ndk::ICInterface>());
   }
 };
-
 void OnDied(void*) {}
 
-// Transaction codes are enumerators, not macros.
 #ifdef FIRST_CALL_TRANSACTION
-#error FIRST_CALL_TRANSACTION must not be a macro
+#error FIRST_CALL_TRANSACTION must be an enumerator
 #endif
 static_assert(std::is_enum_v<decltype(FIRST_CALL_TRANSACTION)>);
 
@@ -44,27 +36,24 @@ int main() {
   ndk::ScopedAStatus status = ndk::ScopedAStatus::ok();
   ndk::ScopedAIBinder_Weak weak(AIBinder_Weak_new(binder.get()));
   ndk::ScopedAIBinder_DeathRecipient recipient(AIBinder_DeathRecipient_new(OnDied));
-  int code = FIRST_CALL_TRANSACTION;
 #if DALIX_CASE == 3
-  auto* raw = new Thing();
+  delete new Thing();
 #elif DALIX_CASE == 4
-  auto owned = std::make_unique<Thing>();
+  std::make_unique<Thing>();
 #elif DALIX_CASE == 5
-  const Thing& fixed = *thing;
-  auto again = fixed.ref<Thing>();
+  std::as_const(*thing).ref<Thing>();
 #elif DALIX_CASE == 6
-  AIBinder* taken = binder.release();
+  AIBinder_decStrong(binder.release());
 #elif DALIX_CASE == 7
-  AStatus* taken = status.release();
+  AStatus_delete(status.release());
 #elif DALIX_CASE == 8
-  AIBinder_Weak* taken = weak.release();
+  AIBinder_Weak_delete(weak.release());
 #elif DALIX_CASE == 9
-  AIBinder_DeathRecipient* taken = recipient.release();
+  AIBinder_DeathRecipient_delete(recipient.release());
 #elif DALIX_CASE == 10
-  const ndk::ScopedAIBinder_Weak& fixed = weak;
-  ndk::SpAIBinder promoted = fixed.promote();
+  std::as_const(weak).promote();
 #elif DALIX_CASE == 11
-  code = EX_HAS_REPLY_HEADER;
+  return EX_HAS_REPLY_HEADER;
 #elif DALIX_CASE == 12
   AServiceManager_addService(binder.get(), "test.IThing/default");
 #elif DALIX_CASE == 13
@@ -82,11 +71,9 @@ int main() {
 #elif DALIX_CASE == 19
   ndk::ScopedAStatus::fromExceptionCode(EX_ILLEGAL_STATE);
 #else
-  // Each marked result may be dropped on purpose.
-  (void)AServiceManager_addService(binder.get(), "test.IThing/default");
-  ndk::SpAIBinder found(AServiceManager_checkService("test.IThing/default"));
-  ndk::SpAIBinder promoted = weak.promote();
+  (void)AServiceManager_addService(binder.get(), "test.IThing/default");  // dropped on purpose
   (void)ndk::ScopedAStatus::fromExceptionCode(EX_ILLEGAL_STATE);
+  ndk::SpAIBinder promoted = weak.promote();
 #endif
-  return code == FIRST_CALL_TRANSACTION && status.isOk() ? 0 : 1;
+  return status.isOk() ? 0 : 1;
 }

@@ -3,6 +3,22 @@
 // What the host binder emulation offers beyond the platform API: the hooks
 // that the generated interface library uses in place of parcels, and the
 // controls a test harness needs. Service code never includes this header.
+//
+// Where the emulation differs from a device on purpose:
+// - Every binder lives in this process. A local object reached through
+//   IX::fromBinder() still comes back as a proxy (BpX), as a client in
+//   another process would get one, and its calls still run on the service
+//   thread; on a device, fromBinder() of a local binder returns the object
+//   itself and calls run on the caller's thread. Keeping the proxy is what
+//   lets one test process play both the clients and the single-threaded
+//   service, with every call crossing the same boundary checks
+//   (ParcelCheck) and status rules as a real transaction.
+// - Nothing is marshalled: values are handed over as C++ objects, after
+//   ParcelCheck has measured what their parcel would hold.
+// - A client "process" dies only when a harness calls KillBinder(); on a
+//   device death comes from the kernel. The notifications that follow run
+//   on the service thread as they do there.
+// - AIBinder_isRemote() is always false, since nothing is remote.
 
 #include <functional>
 #include <memory>

@@ -1,45 +1,17 @@
 #include "sim/simulated_driver.h"
 
-#include <math.h>
-#include <time.h>
-
 #include "net/mcps802154.h"
 #include "net/nl802154.h"
 
 namespace hardware {
 namespace dalix {
 namespace sim {
-namespace {
-
-constexpr double kCentimetresPerMetre = 100;
-
-uint64_t MonotonicNs() {
-  timespec now;
-  clock_gettime(CLOCK_MONOTONIC, &now);
-  return static_cast<uint64_t>(now.tv_sec) * 1000000000u + now.tv_nsec;
-}
-
-}  // namespace
-
-std::optional<PeerObservation> SimulatedDriver::WorldPeers::Observe(uint32_t hw_index,
-                                                                    uint64_t peer_address) {
-  std::optional<Peer> peer = world_->FindPeerByExtendedAddress(peer_address);
-  if (!peer) return std::nullopt;
-  std::optional<Observation> seen =
-      world_->Measure(hw_index, peer->short_address, world_->SecondsAt(MonotonicNs()));
-  if (!seen || !seen->in_range || seen->stopped) return std::nullopt;
-  PeerObservation observation;
-  observation.distance_cm = static_cast<uint32_t>(lround(seen->distance_m * kCentimetresPerMetre));
-  observation.azimuth_rad = seen->azimuth_rad;
-  observation.elevation_rad = seen->elevation_rad;
-  return observation;
-}
 
 SimulatedDriver::SimulatedDriver()
     : mcps_family_(&radios_),
       nl802154_family_(&devices_),
       fira_region_(&simulator_, &radios_, &world_),
-      simple_ranging_(&simulator_, &radios_, &devices_, &world_peers_),
+      simple_ranging_(&simulator_, &radios_, &devices_, &world_),
       ccc_test_mode_(&radios_) {
   mcps_family_.SetCommandHandler(
       MCPS802154_CMD_SET_RANGING_REQUESTS,

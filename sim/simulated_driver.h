@@ -10,7 +10,6 @@
 #include "sim/fira_region_sim.h"
 #include "sim/mcps_family.h"
 #include "sim/nl802154_family.h"
-#include "sim/peer_angle_source.h"
 #include "sim/radio_store.h"
 #include "sim/simple_ranging_sim.h"
 #include "sim/world.h"
@@ -58,17 +57,6 @@ class SimulatedDriver {
   uint32_t port() const { return simulator_.port(); }
 
  private:
-  // Simple ranging sees the world's peers by their extended address, with
-  // the world's noise, at the moment of the report.
-  class WorldPeers : public PeerAngleSource {
-   public:
-    explicit WorldPeers(World* world) : world_(world) {}
-    std::optional<PeerObservation> Observe(uint32_t hw_index, uint64_t peer_address) override;
-
-   private:
-    World* const world_;
-  };
-
   // Whether the network interface on the phy of radio |hw_index| is up.
   bool InterfaceUp(uint32_t hw_index) const;
 
@@ -76,7 +64,6 @@ class SimulatedDriver {
   RadioStore radios_;
   WpanDeviceStore devices_;
   World world_;
-  WorldPeers world_peers_{&world_};
   McpsFamily mcps_family_;
   Nl802154Family nl802154_family_;
   // Stopped first, by the destructor, so that its thread never runs a

@@ -273,6 +273,10 @@ void RangingClient::OnFiraStopped(int32_t /*session_id*/) {
   fira_stopped_.notify_all();
 }
 
+ndk::SpAIBinder RangingClient::client_binder() {
+  return client_callback_ != nullptr ? client_callback_->asBinder() : ndk::SpAIBinder();
+}
+
 void RangingClient::SetResultListener(ResultListener listener) {
   std::lock_guard<std::mutex> lock(mutex_);
   listener_ = std::move(listener);

@@ -93,6 +93,9 @@ class RangingClient {
   bool Stop(std::string* error);
 
   void SetResultListener(ResultListener listener);
+  // The binder that stands for this client with the HAL once it is open
+  // (the one whose death closes the HAL); null before.
+  ndk::SpAIBinder client_binder();
   // By radio, then mode, then address.
   std::vector<PeerReading> Readings() const;
 

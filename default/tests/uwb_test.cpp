@@ -13,7 +13,6 @@
 #include <string>
 #include <vector>
 
-#include <aidl/aidl/hardware/dalix/uwb/BnFiraSessionCallback.h>
 #include <aidl/aidl/hardware/dalix/uwb/BnUwbClientCallback.h>
 #include <android/binder_manager.h>
 #include <binder_host/host.h>
@@ -34,47 +33,12 @@ namespace dalix {
 namespace {
 
 namespace uwb = aidl::aidl::hardware::dalix::uwb;
+using ::testing::ContainsRegex;
 using ::testing::ElementsAre;
+using ::testing::HasSubstr;
 using ::testing::IsEmpty;
 
 class Client : public uwb::BnUwbClientCallback {};
-
-// Counts FiRa results; the service calls it on its thread.
-class FiraResults : public uwb::BnFiraSessionCallback {
- public:
-  ndk::ScopedAStatus onTwrResult(const uwb::FiraRangingData&,
-                                 const std::vector<uwb::FiraTwrMeasurement>&) override {
-    std::lock_guard<std::mutex> lock(mutex_);
-    ++results_;
-    changed_.notify_all();
-    return ndk::ScopedAStatus::ok();
-  }
-  ndk::ScopedAStatus onControleesAdded(int32_t, const std::vector<uwb::UwbAddress>&) override {
-    return ndk::ScopedAStatus::ok();
-  }
-  ndk::ScopedAStatus onControleesAddFailed(int32_t, const std::vector<uwb::UwbAddress>&,
-                                           int32_t) override {
-    return ndk::ScopedAStatus::ok();
-  }
-  ndk::ScopedAStatus onControleesRemoved(int32_t, const std::vector<uwb::UwbAddress>&) override {
-    return ndk::ScopedAStatus::ok();
-  }
-  ndk::ScopedAStatus onControleesRemoveFailed(int32_t, const std::vector<uwb::UwbAddress>&,
-                                              int32_t) override {
-    return ndk::ScopedAStatus::ok();
-  }
-  ndk::ScopedAStatus onSessionStopped(int32_t) override { return ndk::ScopedAStatus::ok(); }
-
-  bool WaitFor(int count) {
-    std::unique_lock<std::mutex> lock(mutex_);
-    return changed_.wait_for(lock, std::chrono::seconds(5), [&] { return results_ >= count; });
-  }
-
- private:
-  std::mutex mutex_;
-  std::condition_variable changed_;
-  int results_ = 0;
-};
 
 class UwbTest : public ::testing::Test {
  protected:
@@ -247,33 +211,39 @@ TEST_F(UwbTest, ClientDeathDuringFiraRangingStopsTheRadioAndTheNextClientStartsC
   tools::FiraOptions options;
   options.controlees = {peer.short_address};
   options.block_duration_ms = 20;
-  auto client = ndk::SharedRefBase::make<Client>();
-  ASSERT_TRUE(uwb_->open(client).isOk());
-  std::shared_ptr<uwb::IUwbIface> iface;
-  std::shared_ptr<uwb::IFiraController> fira;
-  ASSERT_TRUE(uwb_->getIface("wpan0", &iface).isOk());
-  ASSERT_TRUE(iface->firaController(&fira).isOk());
-  auto results = ndk::SharedRefBase::make<FiraResults>();
-  ASSERT_TRUE(fira->setSessionCallback(results).isOk());
-  ASSERT_TRUE(fira->initNewTwrSession(tools::RangingClient::MakeFiraSession(options)).isOk());
-  ASSERT_TRUE(fira->startRangingSession(options.session_id).isOk());
-  ASSERT_TRUE(results->WaitFor(3));
-  EXPECT_TRUE(IsUp("wpan0"));
+  {
+    tools::RangingClient client(uwb_);
+    std::mutex mutex;
+    std::condition_variable changed;
+    int results = 0;
+    client.SetResultListener([&](const tools::PeerReading&) {
+      std::lock_guard<std::mutex> lock(mutex);
+      ++results;
+      changed.notify_all();
+    });
+    std::string error;
+    ASSERT_TRUE(client.Open(&error) && client.StartFira("wpan0", options, &error)) << error;
+    std::unique_lock<std::mutex> lock(mutex);
+    ASSERT_TRUE(changed.wait_for(lock, std::chrono::seconds(5), [&] { return results >= 3; }));
+    lock.unlock();
+    EXPECT_TRUE(IsUp("wpan0"));
 
-  const std::string dump = tools::DumpService(uwb_->asBinder().get());
-  EXPECT_THAT(dump, ::testing::HasSubstr("UWB HAL: open, client alive, 1 radio(s)"));
-  EXPECT_THAT(dump, ::testing::HasSubstr(
-                        "radio wpan0: hw index 0, phy 0, scheduler endless, interface up"));
-  EXPECT_THAT(dump, ::testing::HasSubstr("FiRa: 1 session(s), 1 running"));
-  EXPECT_THAT(dump, ::testing::ContainsRegex("session 1: running, [0-9]+ notification"));
+    const std::string dump = tools::DumpService(uwb_->asBinder().get());
+    EXPECT_THAT(dump, HasSubstr("UWB HAL: open, client alive, 1 radio(s)"));
+    EXPECT_THAT(dump, HasSubstr("radio wpan0: hw index 0, phy 0, scheduler endless, interface up"));
+    EXPECT_THAT(dump, HasSubstr("FiRa: 1 session(s), 1 running"));
+    EXPECT_THAT(dump, ContainsRegex("session 1: running, [0-9]+ notification"));
 
-  ndk::host::KillBinder(client->asBinder().get());
-  EXPECT_THAT(Names(), IsEmpty());
-  EXPECT_FALSE(IsUp("wpan0"));
-  EXPECT_EQ(driver_.radios().Radio(0)->scheduler, kMcpsSchedulerDefault);
-  EXPECT_TRUE(driver_.fira_region().Sessions().empty());
+    ndk::host::KillBinder(client.client_binder().get());
+    EXPECT_THAT(Names(), IsEmpty());
+    EXPECT_FALSE(IsUp("wpan0"));
+    EXPECT_EQ(driver_.radios().Radio(0)->scheduler, kMcpsSchedulerDefault);
+    EXPECT_TRUE(driver_.fira_region().Sessions().empty());
+  }
 
   ASSERT_TRUE(uwb_->open(ndk::SharedRefBase::make<Client>()).isOk());
+  std::shared_ptr<uwb::IUwbIface> iface;
+  std::shared_ptr<uwb::IFiraController> fira;
   ASSERT_TRUE(uwb_->getIface("wpan0", &iface).isOk());
   ASSERT_TRUE(iface->firaController(&fira).isOk());
   int32_t sessions = -1;
@@ -281,7 +251,7 @@ TEST_F(UwbTest, ClientDeathDuringFiraRangingStopsTheRadioAndTheNextClientStartsC
   EXPECT_EQ(sessions, 0);
   EXPECT_TRUE(fira->initNewTwrSession(tools::RangingClient::MakeFiraSession(options)).isOk());
   EXPECT_THAT(tools::DumpService(uwb_->asBinder().get()),
-              ::testing::HasSubstr("session 1: initialized, no notification"));
+              HasSubstr("session 1: initialized, no notification"));
 }
 
 TEST_F(UwbTest, CloseOnAClosedHalOnlyLogsTheInternalClose) {

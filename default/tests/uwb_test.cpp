@@ -13,17 +13,13 @@
 #include <string>
 #include <vector>
 
-#include <aidl/aidl/hardware/dalix/uwb/BnUwbClientCallback.h>
-#include <android/binder_manager.h>
 #include <binder_host/host.h>
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
 #include "net/mcps802154.h"
 #include "net/nl802154.h"
-#include "service_main.h"
-#include "sim/service_thread.h"
-#include "sim/simulated_driver.h"
+#include "tests/e2e_fixture.h"
 #include "tests/log_capture.h"
 #include "tools/ranging_client.h"
 #include "tools/service_dump.h"
@@ -38,47 +34,7 @@ using ::testing::ElementsAre;
 using ::testing::HasSubstr;
 using ::testing::IsEmpty;
 
-class Client : public uwb::BnUwbClientCallback {};
-
-class UwbTest : public ::testing::Test {
- protected:
-  void SetUp() override { ASSERT_TRUE(driver_.Start()); }
-
-  void TearDown() override {
-    if (uwb_ != nullptr) {
-      EXPECT_TRUE(uwb_->close().isOk());
-    }
-    uwb_.reset();
-    service_.Stop();
-  }
-
-  void AddRadio(uint32_t hw_index, uint32_t phy, const std::string& ifname) {
-    std::string error;
-    ASSERT_TRUE(driver_.AddRadio(hw_index, phy, ifname, &error)) << error;
-  }
-
-  void StartService() {
-    service_.Start();
-    uwb_ = uwb::IUwb::fromBinder(
-        ndk::SpAIBinder(AServiceManager_checkService(ServiceInstanceName().c_str())));
-    ASSERT_NE(uwb_, nullptr);
-  }
-
-  std::vector<std::string> Names() {
-    std::vector<std::string> names;
-    EXPECT_TRUE(uwb_->listIfaceNames(&names).isOk());
-    return names;
-  }
-
-  bool IsUp(const std::string& ifname) {
-    std::optional<sim::WpanDevice> device = driver_.devices().FindByName(ifname);
-    return device.has_value() && device->up;
-  }
-
-  sim::SimulatedDriver driver_;
-  sim::ServiceThread service_{driver_.port(), &driver_.devices()};
-  std::shared_ptr<uwb::IUwb> uwb_;
-};
+using UwbTest = EndToEndTest;
 
 struct OpenCase {
   const char* name;

@@ -141,7 +141,12 @@ class Recorder {
                stats.measured, mean, stats.max_abs_error);
       *text += line;
       if (stats.measured > 0) ++peers_per_radio[key.second];
-      if (stats.measured == 0 || stats.max_abs_error > site_->ErrorBound(stats.mode)) ok = false;
+      if (stats.measured == 0 || stats.max_abs_error > site_->ErrorBound(stats.mode)) {
+        snprintf(line, sizeof(line), "  peer %c on %s: off by more than %.2f m\n", key.first,
+                 key.second.c_str(), site_->ErrorBound(stats.mode));
+        *text += line;
+        ok = false;
+      }
     }
     for (const char* radio : {DemoSite::kFiraRadio, DemoSite::kSimpleRangingRadio}) {
       if (peers_per_radio[radio] != peers) {

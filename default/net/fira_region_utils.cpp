@@ -738,9 +738,14 @@ int FiraRegionUtils::OnRangingResult(nl_msg* msg) {
 std::vector<FiraRegionUtils::FiraTwrMeasurement> FiraRegionUtils::ParseMeasurements(
     const HwConfig& hw_config, nlattr** ranging_data_attrs, uint64_t timestamp_ns) {
   std::vector<FiraTwrMeasurement> measurements;
+  nlattr* list = ranging_data_attrs[FIRA_RANGING_DATA_ATTR_MEASUREMENTS];
   nlattr* entry;
   int remaining;
-  nla_for_each_nested(entry, ranging_data_attrs[FIRA_RANGING_DATA_ATTR_MEASUREMENTS], remaining) {
+  // One allocation for the list, not one per doubling.
+  size_t count = 0;
+  nla_for_each_nested(entry, list, remaining)++ count;
+  measurements.reserve(count);
+  nla_for_each_nested(entry, list, remaining) {
     nlattr* fields[FIRA_MEASUREMENT_ATTR_MAX + 1] = {};
     if (nla_parse_nested(fields, FIRA_MEASUREMENT_ATTR_MAX, entry, kFiraMeasurementPolicy.data()) !=
         0) {
@@ -778,6 +783,10 @@ std::vector<FiraRegionUtils::FiraTwrMeasurement> FiraRegionUtils::ParseMeasureme
 
       FiraAntennaMeasurement angles;
       uint8_t pair = kFiraNoAntennaPair;
+      const int angle_nests = (fields[FIRA_MEASUREMENT_ATTR_AOA] != nullptr) +
+                              (fields[FIRA_MEASUREMENT_ATTR_AOA_AZIMUTH] != nullptr) +
+                              (fields[FIRA_MEASUREMENT_ATTR_AOA_ELEVATION] != nullptr);
+      if (angle_nests > 0) measurement.antennaMeasurements.reserve(angle_nests);
       if (nlattr* azimuth = fields[FIRA_MEASUREMENT_ATTR_AOA_AZIMUTH];
           azimuth != nullptr && ParseAntennaMeasurement(azimuth, &angles, &pair)) {
         angles.kind = kFiraAntennaKindAzimuth;

@@ -4,21 +4,19 @@
 // client's binder call waits while a session ranges on the watched socket.
 
 #include <algorithm>
-#include <atomic>
 #include <chrono>
-#include <condition_variable>
 #include <cstdint>
 #include <memory>
-#include <mutex>
+#include <optional>
 #include <string>
 #include <vector>
 
-#include <aidl/aidl/hardware/dalix/uwb/BnFiraSessionCallback.h>
 #include <android-base/logging.h>
 #include <benchmark/benchmark.h>
 
 #include "fira_controller.h"
 #include "net/unique_nl_msg.h"
+#include "sim/fira_client_callback.h"
 #include "sim/fira_notification.h"
 #include "sim/private_namespace.h"
 #include "sim/service_harness.h"
@@ -29,54 +27,9 @@ namespace dalix {
 namespace {
 
 namespace uwb = aidl::hardware::dalix::uwb;
-using ndk::ScopedAStatus;
 
 constexpr int32_t kSessionId = 42;
 constexpr int kPeers = 8;
-
-// Hands each result over to the benchmark's thread, as a client would hand
-// it to its own.
-class HandOffCallback : public uwb::BnFiraSessionCallback {
- public:
-  using Addresses = std::vector<uwb::UwbAddress>;
-  ScopedAStatus onTwrResult(const uwb::FiraRangingData&,
-                            const std::vector<uwb::FiraTwrMeasurement>& measurements) override {
-    {
-      std::lock_guard<std::mutex> lock(mutex_);
-      ++results_;
-      last_size_ = measurements.size();
-    }
-    arrived_.notify_one();
-    return ScopedAStatus::ok();
-  }
-  ScopedAStatus onControleesAdded(int32_t, const Addresses&) override { return Ok(); }
-  ScopedAStatus onControleesAddFailed(int32_t, const Addresses&, int32_t) override { return Ok(); }
-  ScopedAStatus onControleesRemoved(int32_t, const Addresses&) override { return Ok(); }
-  ScopedAStatus onControleesRemoveFailed(int32_t, const Addresses&, int32_t) override {
-    return Ok();
-  }
-  ScopedAStatus onSessionStopped(int32_t) override { return Ok(); }
-
-  // Waits until more than |seen| results arrived; false after a second.
-  bool WaitBeyond(uint64_t seen, size_t* size) {
-    std::unique_lock<std::mutex> lock(mutex_);
-    const bool arrived =
-        arrived_.wait_for(lock, std::chrono::seconds(1), [&] { return results_ > seen; });
-    *size = last_size_;
-    return arrived;
-  }
-  uint64_t results() {
-    std::lock_guard<std::mutex> lock(mutex_);
-    return results_;
-  }
-
- private:
-  static ScopedAStatus Ok() { return ScopedAStatus::ok(); }
-  std::mutex mutex_;
-  std::condition_variable arrived_;
-  uint64_t results_ = 0;
-  size_t last_size_ = 0;
-};
 
 // A running session of one controller on one simulated radio, reached by the
 // benchmark's thread through the controller's binder proxy.
@@ -121,12 +74,13 @@ class RunningSession {
   const std::string& error() const { return error_; }
   sim::ServiceHarness& harness() { return harness_; }
   uwb::IFiraController& controller() { return *proxy_; }
-  HandOffCallback& callback() { return *callback_; }
+  sim::FiraClientCallback& callback() { return *callback_; }
 
  private:
   sim::ServiceHarness harness_;
   std::shared_ptr<uwb::IFiraController> proxy_;
-  std::shared_ptr<HandOffCallback> callback_ = ndk::SharedRefBase::make<HandOffCallback>();
+  std::shared_ptr<sim::FiraClientCallback> callback_ =
+      ndk::SharedRefBase::make<sim::FiraClientCallback>();
   std::string error_;
 };
 
@@ -171,11 +125,13 @@ void BM_FiraNotificationToClient(benchmark::State& state) {
     state.SkipWithError("the notification does not encode");
     return;
   }
-  uint64_t seen = session.callback().results();
+  size_t received = 0;
   for (auto _ : state) {
-    size_t size = 0;
+    // The client's thread takes each result as it arrives.
+    std::optional<sim::FiraClientCallback::Result> result;
     if (!session.harness().simulator().SendEvent(driver_session->port, msg.get()) ||
-        !session.callback().WaitBeyond(seen++, &size) || size != kPeers) {
+        !(result = session.callback().WaitForResult(++received)) ||
+        result->measurements.size() != kPeers) {
       state.SkipWithError("the result did not reach the client");
       break;
     }
@@ -207,7 +163,6 @@ void BM_BinderCallWhileRanging(benchmark::State& state) {
     slowest_us = std::max(slowest_us, took.count());
   }
   state.counters["slowest_us"] = slowest_us;
-  state.counters["results"] = static_cast<double>(session.callback().results());
 }
 BENCHMARK(BM_BinderCallWhileRanging)->Arg(0)->Arg(20)->Arg(200)->UseRealTime();
 

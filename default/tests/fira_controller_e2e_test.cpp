@@ -10,8 +10,8 @@
 #include <gtest/gtest.h>
 
 #include "fira_controller.h"
+#include "sim/fira_client_callback.h"
 #include "sim/service_harness.h"
-#include "tests/fira_client_callback.h"
 #include "tests/fira_session_builder.h"
 
 namespace hardware {
@@ -37,7 +37,7 @@ class FiraControllerE2eTest : public ::testing::Test {
       }
     });
     for (auto& proxy : proxies_) {
-      callbacks_.push_back(ndk::SharedRefBase::make<FiraClientCallback>());
+      callbacks_.push_back(ndk::SharedRefBase::make<sim::FiraClientCallback>());
       ASSERT_TRUE(proxy->setSessionCallback(callbacks_.back()).isOk());
     }
   }
@@ -66,14 +66,15 @@ class FiraControllerE2eTest : public ::testing::Test {
   // Results of |radio| arrive for session |id| and carry each peer's true
   // distance, in centimetres, at the result's time.
   void ExpectRanging(int radio, int32_t id, const std::vector<uint16_t>& peers) {
-    const auto results = callbacks_[radio]->WaitForResults(3);
-    ASSERT_FALSE(results.empty());
-    const auto& last = results.back();
-    EXPECT_EQ(id, last.data.sessionId);
-    EXPECT_LT(results.front().data.index, last.data.index);
-    ASSERT_EQ(peers.size(), last.measurements.size());
+    const auto first = callbacks_[radio]->WaitForResult(1);
+    ASSERT_TRUE(first.has_value());
+    const auto last = callbacks_[radio]->WaitForResult(first->arrival + 3);
+    ASSERT_TRUE(last.has_value());
+    EXPECT_EQ(id, last->data.sessionId);
+    EXPECT_LT(first->data.index, last->data.index);
+    ASSERT_EQ(peers.size(), last->measurements.size());
     for (size_t i = 0; i < peers.size(); ++i) {
-      const uwb::FiraTwrMeasurement& m = last.measurements[i];
+      const uwb::FiraTwrMeasurement& m = last->measurements[i];
       EXPECT_EQ(0, m.status);
       const auto truth = harness_->world().Truth(
           radio, peers[i], harness_->world().SecondsAt(static_cast<uint64_t>(m.timestampNs)));
@@ -84,7 +85,7 @@ class FiraControllerE2eTest : public ::testing::Test {
 
   std::unique_ptr<sim::ServiceHarness> harness_;
   std::vector<std::shared_ptr<uwb::IFiraController>> proxies_;
-  std::vector<std::shared_ptr<FiraClientCallback>> callbacks_;
+  std::vector<std::shared_ptr<sim::FiraClientCallback>> callbacks_;
 };
 
 TEST_F(FiraControllerE2eTest, ClientRunsAWholeSession) {

@@ -14,7 +14,7 @@
 #include <gtest/gtest.h>
 
 #include "net/mcps802154.h"
-#include "tests/fira_client_callback.h"
+#include "sim/fira_client_callback.h"
 #include "tests/fira_session_builder.h"
 #include "tests/log_capture.h"
 #include "tests/mock_driver_clients.h"
@@ -193,7 +193,7 @@ class FiraControllerTest : public ::testing::Test {
                                                            &fira_, &loop_);
     scheduler_ = kMcpsSchedulerDefault;
     up_ = true;
-    callback_ = ndk::SharedRefBase::make<FiraClientCallback>();
+    callback_ = ndk::SharedRefBase::make<sim::FiraClientCallback>();
     if (start != kInitNoCallback) (void)controller_->setSessionCallback(callback_);
     if (start != kEmpty) (void)controller_->initNewTwrSession(ValidFiraSession(1));
     if (start == kRun || start == kRunInit) (void)controller_->startRangingSession(1);
@@ -255,7 +255,7 @@ class FiraControllerTest : public ::testing::Test {
   StrictMock<MockIeeeUtils> ieee_;
   StrictMock<MockFiraRegionUtils> fira_;
   StrictMock<MockEventLoop> loop_;
-  std::shared_ptr<FiraClientCallback> callback_;
+  std::shared_ptr<sim::FiraClientCallback> callback_;
   std::shared_ptr<FiraController> controller_;
 };
 

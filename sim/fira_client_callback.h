@@ -14,17 +14,19 @@
 
 namespace hardware {
 namespace dalix {
+namespace sim {
 
-// A client's session callback that records what the service tells it: each
+// A client's FiRa session callback for the simulated platform: records each
 // call as its short name and session id ("onAdded7", with "?" when a failure
-// carries a reason other than 0), and every result. The service calls it on
-// its thread while the test reads and waits on its own.
+// carries a reason other than 0) and keeps the last result, for a test or
+// benchmark thread to wait on while the service calls in on its own thread.
 class FiraClientCallback : public aidl::hardware::dalix::uwb::BnFiraSessionCallback {
  public:
   using Addresses = std::vector<aidl::hardware::dalix::uwb::UwbAddress>;
   struct Result {
     aidl::hardware::dalix::uwb::FiraRangingData data;
     std::vector<aidl::hardware::dalix::uwb::FiraTwrMeasurement> measurements;
+    size_t arrival = 0;  // 1 for the first result received
   };
 
   ndk::ScopedAStatus onTwrResult(
@@ -57,11 +59,14 @@ class FiraClientCallback : public aidl::hardware::dalix::uwb::BnFiraSessionCallb
       return std::find(events_.begin(), events_.end(), event) != events_.end();
     });
   }
-  // Every result once there are more than |count|; none after 5 s.
-  std::vector<Result> WaitForResults(size_t count) {
+  // The |count|th result once it arrived (the latest if more did), or
+  // nothing after 5 s.
+  std::optional<Result> WaitForResult(size_t count) {
     std::unique_lock<std::mutex> lock(mutex_);
-    changed_.wait_for(lock, std::chrono::seconds(5), [&] { return results_.size() > count; });
-    return results_.size() > count ? results_ : std::vector<Result>();
+    if (!changed_.wait_for(lock, std::chrono::seconds(5), [&] { return results_ >= count; })) {
+      return std::nullopt;
+    }
+    return last_result_;
   }
 
  private:
@@ -69,7 +74,10 @@ class FiraClientCallback : public aidl::hardware::dalix::uwb::BnFiraSessionCallb
                             std::optional<Result> result = std::nullopt) {
     std::lock_guard<std::mutex> lock(mutex_);
     events_.push_back(name + std::to_string(id) + (reason != 0 ? "?" : ""));
-    if (result.has_value()) results_.push_back(std::move(*result));
+    if (result.has_value()) {
+      last_result_ = std::move(*result);
+      last_result_.arrival = ++results_;
+    }
     changed_.notify_all();
     // The service must not care what a client answers.
     return ndk::ScopedAStatus::fromExceptionCode(EX_TRANSACTION_FAILED);
@@ -78,8 +86,10 @@ class FiraClientCallback : public aidl::hardware::dalix::uwb::BnFiraSessionCallb
   std::mutex mutex_;
   std::condition_variable changed_;
   std::vector<std::string> events_;
-  std::vector<Result> results_;
+  size_t results_ = 0;
+  Result last_result_;
 };
 
+}  // namespace sim
 }  // namespace dalix
 }  // namespace hardware

@@ -118,13 +118,17 @@ class RangingSession {
   int family_id_ = 0;
 };
 
+// Both benchmarks start from requests installed through the simulator.
+bool Installed(benchmark::State& state, RangingSession& session, uint32_t* port) {
+  if (session.Install(port)) return true;
+  state.SkipWithError("cannot install ranging requests");
+  return false;
+}
+
 void BM_RangingReportSocketToCallback(benchmark::State& state) {
   RangingSession session;
   uint32_t port = 0;
-  if (!session.Install(&port)) {
-    state.SkipWithError("cannot install ranging requests");
-    return;
-  }
+  if (!Installed(state, session, &port)) return;
   UniqueNlMsg report = session.Report();
   for (auto _ : state) {
     if (!session.simulator_.SendEvent(port, report.get())) state.SkipWithError("send failed");
@@ -139,10 +143,7 @@ BENCHMARK(BM_RangingReportSocketToCallback);
 void BM_RangingReportDecode(benchmark::State& state) {
   RangingSession session;
   uint32_t port = 0;
-  if (!session.Install(&port)) {
-    state.SkipWithError("cannot install ranging requests");
-    return;
-  }
+  if (!Installed(state, session, &port)) return;
   UniqueNlMsg report = session.Report();
   for (auto _ : state) session.mcps_.OnRangingResult(report.get());
 }

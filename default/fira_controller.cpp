@@ -2,6 +2,8 @@
 
 #include "fira_controller.h"
 
+#include <stdio.h>
+
 #include <utility>
 
 #include <android-base/logging.h>
@@ -279,6 +281,10 @@ ndk::ScopedAStatus FiraController::reset() {
 
 void FiraController::OnTwrResult(const FiraRangingData& data,
                                  const std::vector<FiraTwrMeasurement>& measurements) {
+  Notifications& seen = notifications_[static_cast<uint32_t>(data.sessionId)];
+  ++seen.received;
+  seen.last_index = data.index;
+  seen.last_time = std::chrono::steady_clock::now();
   // A client may clear its callback while its sessions run.
   if (session_callback_ == nullptr) return;
   (void)session_callback_->onTwrResult(data, measurements);
@@ -424,6 +430,33 @@ void FiraController::DropAllSessions() {
 bool FiraController::IsFiraScheduler(bool* ok) {
   const McpsHwInfo info = mcps_utils_->GetHardwareInfo(hw_index_, ok);
   return *ok && info.scheduler == kMcpsSchedulerEndless;
+}
+
+}  // namespace dalix
+}  // namespace hardware
+
+namespace hardware {
+namespace dalix {
+
+void FiraController::Dump(std::string* out) const {
+  *out += "  FiRa: " + std::to_string(sessions_.size()) + " session(s), " +
+          std::to_string(running_count_) + " running, session callback " +
+          (session_callback_ != nullptr ? "set" : "not set") + "\n";
+  const auto now = std::chrono::steady_clock::now();
+  for (const auto& [id, state] : sessions_) {
+    *out += "    session " + std::to_string(id) + ": " +
+            (state == kRunning ? "running" : "initialized");
+    auto seen = notifications_.find(id);
+    if (seen == notifications_.end()) {
+      *out += ", no notification\n";
+      continue;
+    }
+    const std::chrono::duration<double> age = now - seen->second.last_time;
+    char last[96];
+    snprintf(last, sizeof(last), ", last index %u, %.3f s ago\n",
+             static_cast<uint32_t>(seen->second.last_index), age.count());
+    *out += ", " + std::to_string(seen->second.received) + " notification(s)" + last;
+  }
 }
 
 }  // namespace dalix

@@ -9,6 +9,7 @@
 
 #include <stdint.h>
 
+#include <chrono>
 #include <map>
 #include <memory>
 #include <optional>
@@ -77,6 +78,10 @@ class FiraController : public aidl::hardware::dalix::uwb::BnFiraController, publ
                    const std::vector<FiraTwrMeasurement>& measurements) override;
   void OnSessionStopped(uint32_t session_id) override;
 
+  // Appends what a dump shows of this radio's FiRa sessions: each session's
+  // state and the notifications it has received.
+  void Dump(std::string* out) const;
+
   // Hands the radio's HAL properties on to the FiRa region client.
   bool SetProperties(ConfigUtils& config);
 
@@ -113,6 +118,13 @@ class FiraController : public aidl::hardware::dalix::uwb::BnFiraController, publ
   // Kept for the client; the service has nothing to tell it.
   std::shared_ptr<IFiraStateCallback> state_callback_;
   std::map<uint32_t, SessionState> sessions_;
+  // Notifications received per session id, for the dump.
+  struct Notifications {
+    uint64_t received = 0;
+    int32_t last_index = 0;
+    std::chrono::steady_clock::time_point last_time;
+  };
+  std::map<uint32_t, Notifications> notifications_;
   // Sessions in kRunning. Follows the driver's stop reports, which may come
   // for sessions this controller never started, so it is not clamped.
   uint32_t running_count_ = 0;

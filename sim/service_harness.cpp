@@ -6,8 +6,6 @@
 #include <android/binder_process.h>
 
 #include "looper/looper_backed_event_loop.h"
-#include "net/mcps802154.h"
-#include "net/nl802154.h"
 #include "sim/sim_interface_tool.h"
 #include "sim/sim_nl_socket_factory.h"
 
@@ -15,22 +13,7 @@ namespace hardware {
 namespace dalix {
 namespace sim {
 
-ServiceHarness::ServiceHarness(std::vector<Radio> radios)
-    : radio_list_(std::move(radios)),
-      fira_region_(&simulator_, &radios_, &world_),
-      mcps_family_(&radios_),
-      nl802154_family_(&devices_) {
-  mcps_family_.AttachFiraRegion(&fira_region_);
-  // The driver ranges only on a radio whose interface is up.
-  fira_region_.SetRadioUpCheck([this](uint32_t hw_index) {
-    for (const Radio& radio : radio_list_) {
-      if (radio.hw_index != hw_index) continue;
-      std::optional<WpanDevice> device = devices_.FindByName(radio.iface);
-      return device.has_value() && device->up;
-    }
-    return false;
-  });
-}
+ServiceHarness::ServiceHarness(std::vector<Radio> radios) : radio_list_(std::move(radios)) {}
 
 ServiceHarness::~ServiceHarness() {
   if (thread_.joinable()) {
@@ -38,17 +21,15 @@ ServiceHarness::~ServiceHarness() {
     RunOnService([this] { static_cast<LooperBackedEventLoop*>(event_loop_)->Quit(); });
     thread_.join();
   }
-  simulator_.Stop();
+  driver_.simulator().Stop();
 }
 
 bool ServiceHarness::Start(std::string* error) {
+  // Each radio drives the phy of its own number.
   for (const Radio& radio : radio_list_) {
-    radios_.AddRadio(radio.hw_index, radio.hw_index);
-    if (!devices_.AddDevice({radio.iface, radio.hw_index}, error)) return false;
+    if (!driver_.AddRadio(radio.hw_index, radio.hw_index, radio.iface, error)) return false;
   }
-  simulator_.RegisterFamily(kMcpsFamilyName, &mcps_family_);
-  simulator_.RegisterFamily(kNl802154FamilyName, &nl802154_family_);
-  if (!simulator_.Start()) {
+  if (!driver_.Start()) {
     *error = "the driver simulator did not start";
     return false;
   }
@@ -86,11 +67,11 @@ void ServiceHarness::Serve(const std::function<void(bool)>& ready) {
     return;
   }
   auto clients = std::make_unique<Clients>();
-  clients->factory = std::make_unique<SimNlSocketFactory>(&loop, simulator_.port());
+  clients->factory = std::make_unique<SimNlSocketFactory>(&loop, driver_.port());
   clients->mcps = std::make_unique<McpsUtils>(clients->factory.get());
   clients->ieee = std::make_unique<IeeeUtils>(clients->factory.get());
   clients->fira = std::make_unique<FiraRegionUtils>(clients->factory.get());
-  clients->interface_tool = std::make_unique<SimInterfaceTool>(&devices_);
+  clients->interface_tool = std::make_unique<SimInterfaceTool>(&driver_.devices());
   const bool started = clients->mcps->Start() && clients->ieee->Setup();
   clients->fira->SetMcpsNetId(clients->mcps->GetNetId());
   clients_ = std::move(clients);

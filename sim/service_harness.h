@@ -13,13 +13,7 @@
 #include "net/interface_tool.h"
 #include "net/mcps_utils.h"
 #include "net/nl_socket_factory.h"
-#include "sim/driver_simulator.h"
-#include "sim/fira_region_sim.h"
-#include "sim/mcps_family.h"
-#include "sim/nl802154_family.h"
-#include "sim/radio_store.h"
-#include "sim/world.h"
-#include "sim/wpan_device_store.h"
+#include "sim/simulated_driver.h"
 
 namespace hardware {
 namespace dalix {
@@ -62,11 +56,11 @@ class ServiceHarness {
   InterfaceTool* interface_tool() { return clients_->interface_tool.get(); }
   EventLoop* event_loop() { return event_loop_; }
 
-  DriverSimulator& simulator() { return simulator_; }
-  RadioStore& radios() { return radios_; }
-  WpanDeviceStore& devices() { return devices_; }
-  World& world() { return world_; }
-  FiraRegionSim& fira_region() { return fira_region_; }
+  DriverSimulator& simulator() { return driver_.simulator(); }
+  RadioStore& radios() { return driver_.radios(); }
+  WpanDeviceStore& devices() { return driver_.devices(); }
+  World& world() { return driver_.world(); }
+  FiraRegionSim& fira_region() { return driver_.fira_region(); }
 
  private:
   struct Clients {
@@ -80,13 +74,7 @@ class ServiceHarness {
   void Serve(const std::function<void(bool)>& ready);
 
   const std::vector<Radio> radio_list_;
-  RadioStore radios_;
-  WpanDeviceStore devices_;
-  World world_;
-  DriverSimulator simulator_;
-  FiraRegionSim fira_region_;
-  McpsFamily mcps_family_;
-  Nl802154Family nl802154_family_;
+  SimulatedDriver driver_;
   // Owned by the service thread, valid while it serves.
   std::unique_ptr<Clients> clients_;
   EventLoop* event_loop_ = nullptr;

@@ -96,6 +96,11 @@ class McpsUtils {
   // result for the handler. Anything else is logged and dropped. NL_STOP.
   int OnRangingResult(nl_msg* msg);
 
+  // The simple ranging requests installed now, for diagnostics.
+  virtual std::vector<RangingRequest> InstalledRangingRequests() const {
+    return ranging_requests_;
+  }
+
   // Reads one NEW_HW message. False when the index or the phy name is missing
   // (|info| untouched) or when the phy name carries no number after "phy"
   // (|hw_index| and |scheduler| already filled in).

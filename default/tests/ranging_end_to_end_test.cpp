@@ -1,36 +1,26 @@
-// Simple ranging and CCC through binder proxies, from a client thread, to
-// controllers served on their own event loop, against the simulated driver.
+// Simple ranging and CCC end to end: a client thread opens the whole service
+// and drives the radio's controllers through their binder proxies, against
+// the simulated driver.
 
 #include <aidl/aidl/hardware/dalix/uwb/BnSimpleRangingCallback.h>
-#include <android/binder_process.h>
-#include <binder_host/host.h>
 
-#include <atomic>
 #include <chrono>
 #include <cmath>
 #include <condition_variable>
-#include <future>
 #include <map>
 #include <mutex>
-#include <thread>
 #include <tuple>
 #include <vector>
 
 #include <gtest/gtest.h>
 
-#include "ccc_controller.h"
-#include "looper/looper_backed_event_loop.h"
 #include "net/mcps802154.h"
 #include "net/nl802154.h"
 #include "sim/ccc_test_mode_sim.h"
-#include "sim/driver_simulator.h"
-#include "sim/mcps_family.h"
-#include "sim/nl802154_family.h"
-#include "sim/sim_interface_tool.h"
-#include "sim/sim_nl_socket_factory.h"
 #include "sim/simple_ranging_sim.h"
 #include "sim/world.h"
-#include "simple_ranging_controller.h"
+#include "tests/e2e_fixture.h"
+#include "uwb_aidl.h"
 #include "tests/log_capture.h"
 
 namespace hardware {
@@ -83,81 +73,31 @@ class RecordingCallback : public uwb::BnSimpleRangingCallback {
   int count_ = 0;
 };
 
-class RangingEndToEndTest : public ::testing::Test {
+class RangingEndToEndTest : public EndToEndTest {
  protected:
   void SetUp() override {
-    radios_.AddRadio(kHw, 0u);
+    EndToEndTest::SetUp();
+    AddRadio(kHw, 0, kIface);
     world_.AddPeer(StandingPeer(0xa, kPeerA, 2.5, 0.5, -0.25));
     world_.AddPeer(StandingPeer(0xb, kPeerB, 8.0, -1.0, 0.1));
-    std::string error;
-    ASSERT_TRUE(devices_.AddDevice({kIface, 0}, &error)) << error;
-    mcps_family_.SetCommandHandler(MCPS802154_CMD_SET_RANGING_REQUESTS,
-                                   [this](auto& request, nlattr** attrs, auto& responder) {
-                                     ranging_.SetRangingRequests(request, attrs, responder);
-                                   });
-    mcps_family_.SetCommandHandler(MCPS802154_CMD_TESTMODE,
-                                   [this](auto& request, nlattr** attrs, auto& responder) {
-                                     test_mode_.TestMode(request, attrs, responder);
-                                   });
-    simulator_.RegisterFamily(kMcpsFamilyName, &mcps_family_);
-    simulator_.RegisterFamily(kNl802154FamilyName, &nl802154_family_);
-    ASSERT_TRUE(simulator_.Start());
-    std::promise<void> ready;
-    service_ = std::thread([this, &ready] { Serve(&ready); });
-    ready.get_future().wait();
-    simple_ = uwb::ISimpleRangingController::fromBinder(simple_binder_);
-    ccc_ = uwb::ICccController::fromBinder(ccc_binder_);
-    ASSERT_NE(simple_, nullptr);
-    ASSERT_NE(ccc_, nullptr);
+    StartService();
+    std::shared_ptr<uwb::IUwbIface> iface = OpenIface(kIface);
+    ASSERT_NE(iface, nullptr);
+    ASSERT_TRUE(iface->simpleRangingController(&simple_).isOk());
+    ASSERT_TRUE(iface->cccController(&ccc_).isOk());
   }
 
   void TearDown() override {
     simple_.reset();
     ccc_.reset();
-    simple_binder_ = ccc_binder_ = ndk::SpAIBinder();
-    if (LooperBackedEventLoop* loop = loop_.load()) loop->Quit();
-    if (service_.joinable()) service_.join();
-    simulator_.Stop();
-    ndk::host::ResetForTesting();
+    EndToEndTest::TearDown();
   }
 
-  // The service thread: its objects as the daemon assembles them, then the loop.
-  void Serve(std::promise<void>* ready) {
-    LooperBackedEventLoop loop;
-    int binder_fd = -1;
-    ABinderProcess_setupPolling(&binder_fd);
-    loop.WatchFileDescriptor(binder_fd, EventLoop::kModeInput,
-                             [](int) { ABinderProcess_handlePolledCommands(); });
-    sim::SimNlSocketFactory factory(&loop, simulator_.port());
-    McpsUtils mcps(&factory);
-    IeeeUtils ieee(&factory);
-    CccRegionUtils ccc(&factory);
-    sim::SimInterfaceTool tool(&devices_);
-    if (mcps.Start() && ieee.Setup()) {
-      ccc.SetMcpsNetId(mcps.GetNetId());
-      simple_binder_ =
-          ndk::SharedRefBase::make<SimpleRangingController>(kIface, kHw, &tool, &mcps, &ieee)
-              ->asBinder();
-      ccc_binder_ =
-          ndk::SharedRefBase::make<CccController>(kIface, kHw, &tool, &mcps, &ccc)->asBinder();
-      loop_ = &loop;
-    }
-    ready->set_value();
-    if (loop_ != nullptr) loop.Poll();
-    loop_ = nullptr;
-  }
-
-  sim::RadioStore radios_;
-  sim::WpanDeviceStore devices_;
-  sim::World world_;
-  sim::McpsFamily mcps_family_{&radios_};
-  sim::Nl802154Family nl802154_family_{&devices_};
-  sim::DriverSimulator simulator_;
-  sim::SimpleRangingSim ranging_{&simulator_, &radios_, &devices_, &world_};
-  sim::CccTestModeSim test_mode_{&radios_};
-  std::thread service_;
-  std::atomic<LooperBackedEventLoop*> loop_ = nullptr;
-  ndk::SpAIBinder simple_binder_, ccc_binder_;
+  sim::RadioStore& radios_ = driver_.radios();
+  sim::WpanDeviceStore& devices_ = driver_.devices();
+  sim::World& world_ = driver_.world();
+  sim::CccTestModeSim& test_mode_ = driver_.ccc_test_mode();
+  sim::DriverSimulator& simulator_ = driver_.simulator();
   std::shared_ptr<uwb::ISimpleRangingController> simple_;
   std::shared_ptr<uwb::ICccController> ccc_;
   LogCapture log_;

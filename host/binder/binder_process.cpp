@@ -204,6 +204,8 @@ bool ABinderProcess_setThreadPoolMaxThreadCount(uint32_t /*num_threads*/) {
   return true;
 }
 
+void ABinderProcess_startThreadPool(void) {}
+
 binder_status_t ABinderProcess_setupPolling(int* fd) {
   if (fd == nullptr) return STATUS_UNEXPECTED_NULL;
   const int event_fd = BinderProcess::Get().SetupPolling();

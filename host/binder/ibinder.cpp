@@ -123,6 +123,16 @@ binder_status_t AIBinder_ping(AIBinder* binder) {
   return binder->alive ? STATUS_OK : STATUS_DEAD_OBJECT;
 }
 
+binder_status_t AIBinder_dump(AIBinder* binder, int fd, const char** args, uint32_t num_args) {
+  if (binder == nullptr) return STATUS_UNEXPECTED_NULL;
+  binder_status_t dumped = STATUS_OK;
+  // The caller's strong reference keeps the object while the call runs.
+  const binder_status_t sent = BinderProcess::Get().Transact(binder, [&] {
+    dumped = binder->object->dump(fd, args, num_args);
+  });
+  return sent != STATUS_OK ? sent : dumped;
+}
+
 AIBinder_Weak* AIBinder_Weak_new(AIBinder* binder) {
   if (binder == nullptr) return nullptr;
   ndk::host::internal::IncWeak(binder);

@@ -36,6 +36,10 @@ bool AIBinder_isRemote(const AIBinder* binder);
 bool AIBinder_isAlive(const AIBinder* binder);
 // STATUS_OK while alive, STATUS_DEAD_OBJECT afterwards.
 binder_status_t AIBinder_ping(AIBinder* binder);
+// Has the object behind |binder| write its diagnostic dump to |fd| (what
+// dumpsys asks for), on the service thread like any call. STATUS_DEAD_OBJECT
+// once the binder is killed; otherwise what the object's dump() returned.
+binder_status_t AIBinder_dump(AIBinder* binder, int fd, const char** args, uint32_t num_args);
 
 // A reference that does not keep the binder's object alive.
 struct AIBinder_Weak;

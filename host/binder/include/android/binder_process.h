@@ -15,6 +15,10 @@ extern "C" {
 // Recorded only: the emulation never starts binder threads.
 bool ABinderProcess_setThreadPoolMaxThreadCount(uint32_t num_threads);
 
+// Does nothing: a client process of the emulation receives its callbacks
+// on the service thread, so there are no threads to start.
+void ABinderProcess_startThreadPool(void);
+
 // The two polling calls are declared weak, as the platform declares them
 // for vendor code: the vendor link stub of libbinder_ndk does not carry
 // them, so a vendor program links without them and must check that they

@@ -16,6 +16,8 @@
 #include <binder_host/host.h>
 #include <gtest/gtest.h>
 
+#include "vintf_manifest.h"
+
 namespace {
 
 namespace uwb = ::aidl::aidl::hardware::dalix::uwb;
@@ -152,6 +154,19 @@ TEST_F(InterfaceTest, ClientCallsRunOnTheServiceThreadWithTheirResults) {
   EXPECT_NE(std::static_pointer_cast<uwb::IUwbIface>(service_->iface), iface);
   EXPECT_EQ(service_->iface->asBinder(), iface->asBinder());
   EXPECT_EQ(EX_UNSUPPORTED_OPERATION, s[8].getExceptionCode());
+}
+
+// What the device maker installs must declare exactly the instance the
+// service registers, at the version the interface library was frozen at.
+TEST(VintfFragmentTest, DeclaresTheRootInstanceAtTheFrozenVersion) {
+  std::string error;
+  std::optional<ndk::host::VintfManifest> manifest =
+      ndk::host::VintfManifest::Load(DALIX_VINTF_FRAGMENT, &error);
+  ASSERT_TRUE(manifest.has_value()) << error;
+  ASSERT_EQ(1u, manifest->instances().size());
+  const ndk::host::VintfManifest::Instance& declared = manifest->instances().front();
+  EXPECT_EQ(std::string(uwb::IUwb::descriptor) + "/default", declared.Name());
+  EXPECT_EQ(uwb::IUwb::version, declared.version);
 }
 
 }  // namespace

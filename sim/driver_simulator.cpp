@@ -173,9 +173,15 @@ bool DriverSimulator::SendEvent(uint32_t port, nl_msg* msg) {
   return SendMessage(port, nlmsg_hdr(msg));
 }
 
+void DriverSimulator::SetSendObserver(SendObserver observer) {
+  std::lock_guard<std::mutex> lock(mutex_);
+  send_observer_ = std::move(observer);
+}
+
 bool DriverSimulator::SendRaw(uint32_t port, const void* data, size_t size) {
   std::lock_guard<std::mutex> lock(mutex_);
   if (socket_.get() < 0) return false;
+  if (send_observer_) send_observer_(port, static_cast<const uint8_t*>(data), size);
   sockaddr_nl peer = {};
   peer.nl_family = AF_NETLINK;
   peer.nl_pid = port;

@@ -83,6 +83,12 @@ class DriverSimulator {
   // Requests received so far (controller requests included).
   int RequestCount() const;
 
+  // Called with every datagram the simulator puts on the wire, on the thread
+  // that sends it, before it is sent: lets a tool record what the driver
+  // says. An empty function removes it.
+  using SendObserver = std::function<void(uint32_t port, const uint8_t* data, size_t size)>;
+  void SetSendObserver(SendObserver observer);
+
  private:
   struct Family {
     int id;
@@ -123,6 +129,7 @@ class DriverSimulator {
   std::vector<Task> tasks_;
   uint64_t next_task_order_;
   int request_count_;
+  SendObserver send_observer_;
 };
 
 }  // namespace sim

@@ -25,8 +25,9 @@ struct Fault {
     // does not see the request.
     kAckOnly,
     // Instead of the family's answer, one reply of the request's command that
-    // is cut short inside its generic netlink header (genlmsg_parse refuses
-    // it), then the usual acknowledgement or NLMSG_DONE.
+    // is cut short inside its generic netlink header (so it carries no
+    // command a client can trust), then the usual acknowledgement or
+    // NLMSG_DONE.
     kMalformed,
   };
 

@@ -119,7 +119,12 @@ bool NlSocket::SendAndAwaitResponse(nl_msg* msg, std::function<void(nl_msg*)> on
 
   reader_->SetMessageHandler(
       [got_response, on_response = std::move(on_response), cmd](nl_msg* reply) {
-        int received = genlmsg_hdr(nlmsg_hdr(reply))->cmd;
+        // A message too short for the generic header carries no command at
+        // all: it is taken for one with another command (-1).
+        const nlmsghdr* header = nlmsg_hdr(reply);
+        int received = header->nlmsg_len >= NLMSG_LENGTH(GENL_HDRLEN)
+                           ? genlmsg_hdr(const_cast<nlmsghdr*>(header))->cmd
+                           : -1;
         // An empty callback cannot take the response, so it counts as a mismatch.
         if (on_response && received == cmd) {
           *got_response = true;

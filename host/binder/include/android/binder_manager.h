@@ -12,8 +12,7 @@ extern "C" {
 
 // Registers |binder| under |instance|, replacing an earlier registration of
 // that name; the registry keeps a strong reference. EX_ILLEGAL_ARGUMENT for
-// a null binder or name, and, as on a device, for an instance that the VINTF
-// manifest (on the host: the service's own fragment) does not declare.
+// a null binder or name.
 binder_exception_t AServiceManager_addService(AIBinder* binder, const char* instance);
 // A new strong reference to the registered binder, or null.
 AIBinder* AServiceManager_checkService(const char* instance);

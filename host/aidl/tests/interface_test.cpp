@@ -166,7 +166,8 @@ TEST(VintfFragmentTest, DeclaresTheRootInstanceAtTheFrozenVersion) {
   ASSERT_EQ(1u, manifest->instances().size());
   const ndk::host::VintfManifest::Instance& declared = manifest->instances().front();
   EXPECT_EQ(std::string(uwb::IUwb::descriptor) + "/default", declared.Name());
-  EXPECT_EQ(uwb::IUwb::version, declared.version);
+  const int32_t frozen_version = uwb::IUwb::version;  // a copy: the constant has no definition
+  EXPECT_EQ(frozen_version, declared.version);
 }
 
 }  // namespace

@@ -3,6 +3,9 @@
 # without pkg-config files, so they are found by path and given a run path.
 find_package(PkgConfig REQUIRED)
 pkg_check_modules(LIBNL REQUIRED IMPORTED_TARGET libnl-3.0 libnl-genl-3.0)
+# The host service manager reads the VINTF fragment with the XML library the
+# platform's own manifest reader uses.
+pkg_check_modules(TINYXML2 REQUIRED IMPORTED_TARGET tinyxml2)
 
 set(DALIX_ANDROID_LIBDIRS /usr/lib/${CMAKE_LIBRARY_ARCHITECTURE}/android /usr/lib/android)
 find_path(ANDROID_PLATFORM_INCLUDE_DIR utils/Looper.h PATHS /usr/include/android REQUIRED)

@@ -1,13 +1,18 @@
+#define LOG_TAG "servicemanager"
+
 #include <android/binder_manager.h>
 
 #include <map>
 #include <mutex>
+#include <optional>
 #include <string>
 
+#include <android-base/logging.h>
 #include <android/binder_auto_utils.h>
 #include <binder_host/host.h>
 
 #include "binder_process.h"
+#include "vintf_manifest.h"
 
 namespace {
 
@@ -48,6 +53,25 @@ class ServiceRegistry {
   std::map<std::string, ndk::SpAIBinder> services_;
 };
 
+// As on a device, only an instance that the VINTF manifest declares may be
+// registered. The host's manifest is the project's own fragment, read afresh
+// at each registration so that a test always sees the file as it stands.
+bool DeclaredInManifest(const char* instance) {
+  std::string error;
+  std::optional<ndk::host::VintfManifest> manifest =
+      ndk::host::VintfManifest::Load(DALIX_VINTF_FRAGMENT, &error);
+  if (!manifest.has_value()) {
+    LOG(ERROR) << "AServiceManager_addService: unreadable VINTF manifest " << error;
+    return false;
+  }
+  if (!manifest->Declares(instance)) {
+    LOG(ERROR) << "AServiceManager_addService: " << instance
+               << " is not declared in the VINTF manifest " << DALIX_VINTF_FRAGMENT;
+    return false;
+  }
+  return true;
+}
+
 }  // namespace
 
 namespace ndk {
@@ -65,6 +89,7 @@ extern "C" {
 
 binder_exception_t AServiceManager_addService(AIBinder* binder, const char* instance) {
   if (binder == nullptr || instance == nullptr) return EX_ILLEGAL_ARGUMENT;
+  if (!DeclaredInManifest(instance)) return EX_ILLEGAL_ARGUMENT;
   AIBinder_incStrong(binder);
   ServiceRegistry::Get().Add(instance, ndk::SpAIBinder(binder));
   return EX_NONE;

@@ -21,6 +21,8 @@
 #include <binder_host/parcel_check.h>
 #include <gtest/gtest.h>
 
+#include "vintf_manifest.h"
+
 namespace {
 
 namespace uwb = ::aidl::aidl::hardware::dalix::uwb;
@@ -209,6 +211,20 @@ TEST_F(InterfaceTest, CallsFailAsTheyWouldCrossingAProcessBoundary) {
   }
   EXPECT_EQ(STATUS_BAD_VALUE, results[i].getStatus()) << "a reply that cannot be written";
   EXPECT_EQ(std::vector<std::string>{"kept"}, names);
+}
+
+// What the device maker installs must declare exactly the instance the
+// service registers, at the version the interface library was frozen at.
+TEST(VintfFragmentTest, DeclaresTheRootInstanceAtTheFrozenVersion) {
+  std::string error;
+  std::optional<ndk::host::VintfManifest> manifest =
+      ndk::host::VintfManifest::Load(DALIX_VINTF_FRAGMENT, &error);
+  ASSERT_TRUE(manifest.has_value()) << error;
+  ASSERT_EQ(1u, manifest->instances().size());
+  const ndk::host::VintfManifest::Instance& declared = manifest->instances().front();
+  EXPECT_EQ(std::string(uwb::IUwb::descriptor) + "/default", declared.Name());
+  const int32_t frozen_version = uwb::IUwb::version;  // a copy: the constant has no definition
+  EXPECT_EQ(frozen_version, declared.version);
 }
 
 }  // namespace

@@ -1,0 +1,66 @@
+"""The policy check refuses each kind of broken policy it promises to catch."""
+
+import os
+import shutil
+import subprocess
+import sys
+import tempfile
+import unittest
+
+ROOT = os.path.dirname(os.path.dirname(os.path.dirname(os.path.abspath(__file__))))
+SCRIPT = os.path.join(ROOT, 'scripts', 'check-sepolicy')
+
+# (case, file to append to, text appended, what the report must name)
+BREAKAGES = [
+    ('undeclared type', 'file.te', 'allow hal_dalix_uwb_default nosuch_file:file read;\n',
+     'nosuch_file'),
+    ('undeclared attribute', 'file.te', 'type other_file, nosuch_attribute;\n',
+     'nosuch_attribute'),
+    ('macro argument', 'file.te', 'binder_call(hal_dalix_uwb_default, nosuch_client)\n',
+     'nosuch_client'),
+    ('unknown macro', 'file.te', 'nosuch_macro(hal_dalix_uwb_default)\n', 'nosuch_macro'),
+    ('missing semicolon', 'file.te', 'allow hal_dalix_uwb_default self:udp_socket read\n',
+     'not a rule'),
+    ('unbalanced braces', 'file.te', 'allow hal_dalix_uwb_default self:udp_socket { read;\n',
+     'unbalanced'),
+    ('file context type', 'file_contexts', '/vendor/x u:object_r:nosuch_file:s0\n',
+     'nosuch_file'),
+    ('service context form', 'service_contexts', 'aidl.x.IFoo/default nosuch\n',
+     'service_contexts:2'),
+]
+
+
+class CheckSepolicyTest(unittest.TestCase):
+    def setUp(self):
+        self.work = tempfile.mkdtemp()
+        self.policy = os.path.join(self.work, 'sepolicy')
+        shutil.copytree(os.path.join(ROOT, 'sepolicy'), self.policy)
+
+    def tearDown(self):
+        shutil.rmtree(self.work)
+
+    def check(self):
+        return subprocess.run([sys.executable, '-B', SCRIPT, '--policy-dir', self.policy],
+                              capture_output=True, text=True)
+
+    def test_project_policy_passes(self):
+        result = self.check()
+        self.assertEqual(0, result.returncode, result.stdout)
+
+    def test_each_breakage_fails_naming_its_cause(self):
+        for case, name, text, expected in BREAKAGES:
+            with self.subTest(case):
+                path = os.path.join(self.policy, name)
+                with open(path) as f:
+                    original = f.read()
+                with open(path, 'a') as f:
+                    f.write(text)
+                result = self.check()
+                with open(path, 'w') as f:
+                    f.write(original)
+                self.assertEqual(1, result.returncode, result.stdout)
+                self.assertIn(expected, result.stdout)
+
+
+if __name__ == '__main__':
+    unittest.main()

@@ -22,7 +22,6 @@
 #include "sim/fira_notification.h"
 #include "sim/fira_region_sim.h"
 #include "sim/mcps_family.h"
-#include "sim/private_namespace.h"
 #include "sim/sim_nl_socket_factory.h"
 
 namespace hardware {
@@ -216,16 +215,3 @@ BENCHMARK(BM_ConfigTwrSessionEncoding);
 }  // namespace
 }  // namespace dalix
 }  // namespace hardware
-
-int main(int argc, char** argv) {
-  if (!hardware::dalix::sim::EnterPrivateNamespace()) return 1;
-  // Log lines are formatted as usual and then dropped, so that the terminal
-  // is not part of the measurement.
-  android::base::SetLogger([](android::base::LogId, android::base::LogSeverity, const char*,
-                              const char*, unsigned int, const char*) {});
-  benchmark::Initialize(&argc, argv);
-  if (benchmark::ReportUnrecognizedArguments(argc, argv)) return 1;
-  benchmark::RunSpecifiedBenchmarks();
-  benchmark::Shutdown();
-  return 0;
-}

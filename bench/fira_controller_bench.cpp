@@ -18,7 +18,6 @@
 #include "net/unique_nl_msg.h"
 #include "sim/fira_client_callback.h"
 #include "sim/fira_notification.h"
-#include "sim/private_namespace.h"
 #include "sim/service_harness.h"
 #include "tests/fira_session_builder.h"
 
@@ -169,11 +168,3 @@ BENCHMARK(BM_BinderCallWhileRanging)->Arg(0)->Arg(20)->Arg(200)->UseRealTime();
 }  // namespace
 }  // namespace dalix
 }  // namespace hardware
-
-int main(int argc, char** argv) {
-  if (!hardware::dalix::sim::EnterPrivateNamespace()) return 1;
-  benchmark::Initialize(&argc, argv);
-  benchmark::RunSpecifiedBenchmarks();
-  benchmark::Shutdown();
-  return 0;
-}

@@ -17,7 +17,6 @@
 #include "net/mcps802154.h"
 #include "sim/driver_simulator.h"
 #include "sim/mcps_family.h"
-#include "sim/private_namespace.h"
 #include "sim/sim_interface_tool.h"
 #include "sim/sim_nl_socket_factory.h"
 #include "sim/simple_ranging_sim.h"
@@ -152,15 +151,3 @@ BENCHMARK(BM_RangingReportDecode);
 }  // namespace
 }  // namespace dalix
 }  // namespace hardware
-
-int main(int argc, char** argv) {
-  if (!hardware::dalix::sim::EnterPrivateNamespace()) return 1;
-  // Every report logs; the lines are formatted and dropped.
-  android::base::SetLogger([](android::base::LogId, android::base::LogSeverity, const char*,
-                              const char*, unsigned int, const char*) {});
-  benchmark::Initialize(&argc, argv);
-  if (benchmark::ReportUnrecognizedArguments(argc, argv)) return 1;
-  benchmark::RunSpecifiedBenchmarks();
-  benchmark::Shutdown();
-  return 0;
-}

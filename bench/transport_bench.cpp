@@ -18,7 +18,6 @@
 #include "net/nl_socket.h"
 #include "net/unique_nl_msg.h"
 #include "sim/driver_simulator.h"
-#include "sim/private_namespace.h"
 #include "sim/sim_nl_socket_factory.h"
 #include "sim/test_family.h"
 #include "sim/test_family_defs.h"
@@ -119,16 +118,3 @@ BENCHMARK(BM_BareSocketRoundTrip);
 }  // namespace
 }  // namespace dalix
 }  // namespace hardware
-
-int main(int argc, char** argv) {
-  if (!hardware::dalix::sim::EnterPrivateNamespace()) return 1;
-  // The service logs every exchange; the lines are formatted as usual and
-  // then dropped, so that the terminal is not part of the measurement.
-  android::base::SetLogger([](android::base::LogId, android::base::LogSeverity, const char*,
-                              const char*, unsigned int, const char*) {});
-  benchmark::Initialize(&argc, argv);
-  if (benchmark::ReportUnrecognizedArguments(argc, argv)) return 1;
-  benchmark::RunSpecifiedBenchmarks();
-  benchmark::Shutdown();
-  return 0;
-}

@@ -6,16 +6,20 @@
 #include <optional>
 #include <string>
 #include <tuple>
+#include <utility>
 #include <vector>
 
 #include <gtest/gtest.h>
 
+#include "looper/looper_backed_event_loop.h"
 #include "net/config_utils.h"
 #include "net/mcps802154.h"
 #include "net/mcps_utils.h"
 #include "sim/driver_simulator.h"
 #include "sim/radio_store.h"
 #include "sim/sim_nl_socket_factory.h"
+#include "sim/simple_ranging_sim.h"
+#include "sim/world.h"
 #include "tests/log_capture.h"
 
 namespace hardware {
@@ -24,60 +28,41 @@ namespace sim {
 namespace {
 
 using ::android::base::ERROR;
-using ::android::base::INFO;
 using ::android::base::WARNING;
 
 constexpr char kTag[] = "dalix.uwb.McpsUtils";
+constexpr uint32_t kHw = 2;
+// The next reply to a command is cut short inside its generic netlink header.
+const Fault kMalformedOnce{Fault::Kind::kMalformed, 0, 0, 1};
 
 // The service's McpsUtils against the simulated driver, over real sockets.
 class McpsFamilyTest : public ::testing::Test {
  protected:
   void SetUp() override {
+    family_.SetCommandHandler(MCPS802154_CMD_SET_RANGING_REQUESTS,
+                              [this](auto& request, nlattr** attrs, auto& responder) {
+                                ranging_.SetRangingRequests(request, attrs, responder);
+                              });
     simulator_.RegisterFamily(kMcpsFamilyName, &family_);
     ASSERT_TRUE(simulator_.Start());
     ASSERT_TRUE(mcps_.Start());
+    mcps_.SubscribeRangingResults([](const McpsUtils::RangingResult&) {});
   }
 
   SimRadio Radio(uint32_t hw_index) { return radios_.Radio(hw_index).value_or(SimRadio()); }
 
-  // The radio's scheduler as "name slot_duration node_type regions...".
-  std::string SchedulerState(uint32_t hw_index) {
-    SimRadio radio = Radio(hw_index);
-    std::string state = radio.scheduler + ' ' + std::to_string(radio.slot_duration) + ' ' +
-                        std::to_string(radio.node_type);
-    for (const std::string& region : radio.regions) state += ' ' + region;
-    return state;
-  }
-
-  // |count| keys the driver knows, valued by their position, put into the store.
-  std::map<std::string, uint32_t> AddKnownKeys(int count) {
-    std::map<std::string, uint32_t> keys;
-    for (int i = 0; i < count; ++i) {
-      char key[24];
-      std::snprintf(key, sizeof(key), "bench.key%04d", i);
-      radios_.AddCalibrationKey(key);
-      store_.Set(key, std::to_string(i).c_str());
-      keys[key] = i;
-    }
-    return keys;
-  }
-
-  static constexpr uint32_t kHw = 2;
   RadioStore radios_;
   McpsFamily family_{&radios_};
+  World world_;
+  // Its reports run on the simulator, which is stopped before it goes.
+  SimpleRangingSim ranging_{&simulator_, &radios_, nullptr, &world_};
   DriverSimulator simulator_;
-  SimNlSocketFactory factory_{nullptr, simulator_.port()};
+  LooperBackedEventLoop loop_;
+  SimNlSocketFactory factory_{&loop_, simulator_.port()};
   McpsUtils mcps_{&factory_};
   ConfigUtils store_;
   LogCapture log_;
 };
-
-TEST_F(McpsFamilyTest, StartFailsWhenTheFamilyIsGone) {
-  simulator_.SetFamilyPresent(kMcpsFamilyName, false);
-  McpsUtils other(&factory_);
-  EXPECT_FALSE(other.Start());
-  EXPECT_TRUE(log_.Contains(ERROR, "Start: Generic netlink mcps802154 not found.", kTag));
-}
 
 TEST_F(McpsFamilyTest, DiscoveryKeepsOnlyRadiosWithAUsablePhyName) {
   bool ok = false;
@@ -96,10 +81,8 @@ TEST_F(McpsFamilyTest, DiscoveryKeepsOnlyRadiosWithAUsablePhyName) {
   radios_.AddRadio(14, 5u);
   radios_.SetScheduler(14, std::string(kMcpsNameMaxLen, 's'), -1, -1, {});
   radios_.SetScheduler(7, kMcpsSchedulerEndless, -1, -1, {kMcpsRegionFira});
-  // A reply cut short inside its generic netlink header is dropped and does not
-  // spoil the next dump.
-  const Fault malformed_once{Fault::Kind::kMalformed, 0, 0, 1};
-  simulator_.SetCommandFault(kMcpsFamilyName, MCPS802154_CMD_GET_HW, malformed_once);
+  // A malformed reply is dropped and does not spoil the next dump.
+  simulator_.SetCommandFault(kMcpsFamilyName, MCPS802154_CMD_GET_HW, kMalformedOnce);
   EXPECT_TRUE(mcps_.ListHardware(&ok).empty());
 
   std::vector<std::tuple<uint32_t, uint32_t, std::string>> found;
@@ -126,31 +109,36 @@ TEST_F(McpsFamilyTest, DiscoveryKeepsOnlyRadiosWithAUsablePhyName) {
   info = mcps_.GetHardwareInfo(99, &ok);
   EXPECT_FALSE(ok);
   EXPECT_EQ(std::tie(info.hw_index, info.scheduler), std::make_tuple(0u, std::string()));
+
+  simulator_.SetFamilyPresent(kMcpsFamilyName, false);
+  EXPECT_FALSE(McpsUtils(&factory_).Start());
+  EXPECT_TRUE(log_.Contains(ERROR, "Start: Generic netlink mcps802154 not found.", kTag));
 }
 
 TEST_F(McpsFamilyTest, DumpsAreReadWholeHoweverPacked) {
   // Packed, a few hundred radios fill several datagrams, NLMSG_DONE sharing
   // the last. Unpacked, as many would overflow the client's receive buffer:
   // the kernel writes a dump only as fast as it is read, the simulator at once.
-  const struct {
-    size_t datagram_bytes;
-    uint32_t radios;
-  } kCases[] = {{DriverSimulator::kDefaultDumpDatagramBytes, 300}, {0, 40}, {100, 40}};
-  for (const auto& c : kCases) {
-    SCOPED_TRACE(c.datagram_bytes);
-    for (uint32_t i = 0; i < c.radios; ++i) radios_.AddRadio(i, i + 1);
-    simulator_.SetDumpDatagramBytes(c.datagram_bytes);
+  for (auto [datagram_bytes, radios] :
+       {std::pair<size_t, uint32_t>(DriverSimulator::kDefaultDumpDatagramBytes, 300),
+        {0, 40},
+        {100, 40}}) {
+    SCOPED_TRACE(datagram_bytes);
+    for (uint32_t i = 0; i < radios; ++i) radios_.AddRadio(i, i + 1);
+    simulator_.SetDumpDatagramBytes(datagram_bytes);
     bool ok = false;
     std::vector<McpsHwInfo> found = mcps_.ListHardware(&ok);
     EXPECT_TRUE(ok);
-    ASSERT_EQ(found.size(), c.radios);
-    for (uint32_t i = 0; i < c.radios; ++i) EXPECT_EQ(found[i].phy_index, i + 1);
-    for (uint32_t i = 0; i < c.radios; ++i) radios_.RemoveRadio(i);
+    ASSERT_EQ(found.size(), radios);
+    for (uint32_t i = 0; i < radios; ++i) EXPECT_EQ(found[i].phy_index, i + 1);
+    for (uint32_t i = 0; i < radios; ++i) radios_.RemoveRadio(i);
   }
 }
 
-TEST_F(McpsFamilyTest, SchedulerChangesAreCheckedAndKept) {
+TEST_F(McpsFamilyTest, SchedulerChangesAreCheckedAndKeptAndOnlySimpleRangingTakesRequests) {
   radios_.AddRadio(0, 0u);
+  McpsUtils::RangingRequest request;
+  request.peerAddress = 0x0102030405060708;
   const int kFira = 100;  // SetFiraRegion instead of SetScheduler
   const struct {
     const char* what;
@@ -177,37 +165,43 @@ TEST_F(McpsFamilyTest, SchedulerChangesAreCheckedAndKept) {
                                            static_cast<McpsUtils::NodeType>(step.node_type),
                                            step.params_only);
     EXPECT_EQ(result, step.accepted);
-    EXPECT_EQ(SchedulerState(0), step.state);
+    SimRadio radio = Radio(0);
+    std::string state = radio.scheduler + ' ' + std::to_string(radio.slot_duration) + ' ' +
+                        std::to_string(radio.node_type);
+    for (const std::string& region : radio.regions) state += ' ' + region;
+    EXPECT_EQ(state, step.state);
+    EXPECT_EQ(mcps_.SetRangingRequests(0, {request}),
+              radio.scheduler == kMcpsSchedulerSimpleRanging);
   }
   EXPECT_FALSE(mcps_.SetFiraRegion(9));
 }
 
-TEST_F(McpsFamilyTest, LargeCalibrationArrivesWholeInStoreOrder) {
+TEST_F(McpsFamilyTest, CalibrationArrivesWholeOrFailsTheTransfer) {
   radios_.AddRadio(kHw, 0u);
-  std::map<std::string, uint32_t> values = AddKnownKeys(400);
+  std::map<std::string, uint32_t> values;
+  for (uint32_t i = 0; i < 400; ++i) {
+    char key[24];
+    std::snprintf(key, sizeof(key), "bench.key%04u", i);
+    radios_.AddCalibrationKey(key);
+    store_.Set(key, std::to_string(i).c_str());
+    values[key] = i;
+  }
   ASSERT_TRUE(mcps_.SetCalibration(kHw, &store_));
-  std::vector<std::string> keys;
-  for (const auto& [key, value] : values) keys.push_back(key);
-  SimRadio radio = Radio(kHw);
-  EXPECT_EQ(radio.calibration_keys_received, keys);
-  EXPECT_EQ(radio.calibration, values);
+  EXPECT_EQ(Radio(kHw).calibration, values);
   // 400 elements of 32 bytes take 13 kB: four pages.
-  EXPECT_EQ(radio.calibration_messages, 4);
-}
+  EXPECT_EQ(Radio(kHw).calibration_messages, 4);
 
-TEST_F(McpsFamilyTest, RefusedKeysAndFailedExchangesFailTheTransfer) {
+  radios_.RemoveRadio(kHw);
   radios_.AddRadio(kHw, 0u);
-  AddKnownKeys(200);
   // The driver refuses a message beyond its payload limit, as the kernel would.
   family_.SetMaxPayload(McpsUtils::CalibrationPayloadBudget() - 64);
   EXPECT_FALSE(mcps_.SetCalibration(kHw, &store_));
   family_.SetMaxPayload(McpsUtils::CalibrationPayloadBudget());
-  const Fault malformed_once{Fault::Kind::kMalformed, 0, 0, 1};
-  simulator_.SetCommandFault(kMcpsFamilyName, MCPS802154_CMD_SET_CALIBRATIONS, malformed_once);
+  simulator_.SetCommandFault(kMcpsFamilyName, MCPS802154_CMD_SET_CALIBRATIONS, kMalformedOnce);
   // A reply too short for its generic header carries no command: it is not
   // the awaited one, so the transfer waits in vain and fails.
   EXPECT_FALSE(mcps_.SetCalibration(kHw, &store_));
-  EXPECT_TRUE(log_.Contains(INFO,
+  EXPECT_TRUE(log_.Contains(android::base::INFO,
                             "SendAndAwaitResponse: Incorrect received command, got -1 instead of 8",
                             "dalix.uwb.NlSocket"))
       << log_.Text();
@@ -223,7 +217,7 @@ TEST_F(McpsFamilyTest, RefusedKeysAndFailedExchangesFailTheTransfer) {
   SimRadio radio = Radio(kHw);
   EXPECT_EQ(radio.calibration_messages, 1);
   EXPECT_EQ(radio.calibration_keys_received.front(), "aa.unknown");
-  EXPECT_LT(radio.calibration_keys_received.size(), 201u);
+  EXPECT_LT(radio.calibration_keys_received.size(), 401u);
   EXPECT_EQ(radio.calibration.size(), radio.calibration_keys_received.size() - 1);
   EXPECT_TRUE(log_.Contains(ERROR, "Error on key aa.unknown", kTag));
 }

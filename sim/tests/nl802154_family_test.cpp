@@ -5,6 +5,8 @@
 #include <string.h>
 
 #include <string>
+#include <tuple>
+#include <utility>
 #include <vector>
 
 #include <gtest/gtest.h>
@@ -23,14 +25,27 @@ namespace dalix {
 namespace sim {
 namespace {
 
+using ::android::base::ERROR;
+using ::android::base::WARNING;
+using MacAddress = InterfaceTool::MacAddress;
+// Interfaces as the service lists them: name and phy.
+using Listing = std::vector<std::pair<std::string, uint32_t>>;
+
 constexpr char kTag[] = "dalix.uwb.IeeeUtils";
+constexpr char kToolTag[] = "dalix.uwb.InterfaceTool";
 
 std::string NlError(const char* exchange, int error) {
   return std::string(exchange) + ": Nl error: " + std::to_string(-error);
 }
 
+std::string MacAddressError(const char* iface, int error) {
+  return std::string("Could not set interface MAC address for ") + iface + " (" + strerror(error) +
+         ")";
+}
+
 // The service's IeeeUtils against the simulated family, over real sockets
-// and real interfaces.
+// and real interfaces; beside it the simulator's interface tool, which keeps
+// what a veth cannot hold.
 class Nl802154FamilyTest : public ::testing::Test {
  protected:
   void SetUp() override {
@@ -46,6 +61,16 @@ class Nl802154FamilyTest : public ::testing::Test {
 
   WpanDevice Device(const std::string& name) { return devices_.FindByName(name).value(); }
 
+  Listing List() {
+    bool ok = false;
+    Listing found;
+    for (const DevInfo& device : utils_.ListDevices(&ok)) {
+      found.emplace_back(device.name, device.phy_index);
+    }
+    EXPECT_TRUE(ok);
+    return found;
+  }
+
   // Declared in the order the borrowers need: the simulator goes first.
   WpanDeviceStore devices_;
   Nl802154Family family_{&devices_};
@@ -57,33 +82,22 @@ class Nl802154FamilyTest : public ::testing::Test {
   LogCapture log_;
 };
 
-TEST_F(Nl802154FamilyTest, ListsInterfacesInOrderLeavingOutThoseWithoutNameOrPhy) {
-  WpanDeviceConfig nameless{"wpan1", 1};
-  nameless.dump_without_name = true;
-  WpanDeviceConfig phyless{"wpan2", 2};
-  phyless.dump_without_phy = true;
-  for (const WpanDeviceConfig& config : {WpanDeviceConfig{"wpan0", 0}, nameless, phyless,
-                                         WpanDeviceConfig{"uwb12", 12}}) {
-    Add(config);
-  }
-  // However the kernel packs the dump, every entry is read: all in one
-  // datagram with NLMSG_DONE, one per datagram, two or so per datagram.
+TEST_F(Nl802154FamilyTest, ListsEveryInterfaceHoweverPackedAndForgetsARemovedOne) {
+  for (uint32_t phy : {0, 1}) Add({"wpan" + std::to_string(phy), phy});
+  Add({"uwb12", 12});
+  // All in one datagram with NLMSG_DONE, one per datagram, two or so per datagram.
   for (size_t bytes : {DriverSimulator::kDefaultDumpDatagramBytes, size_t{0}, size_t{120}}) {
     SCOPED_TRACE(bytes);
     simulator_.SetDumpDatagramBytes(bytes);
-    log_.Reset();
-    bool ok = false;
-    const std::vector<DevInfo> devices = utils_.ListDevices(&ok);
-    EXPECT_TRUE(ok);
-    ASSERT_EQ(2u, devices.size());
-    EXPECT_EQ("wpan0", devices[0].name);
-    EXPECT_EQ(0u, devices[0].phy_index);
-    EXPECT_EQ("uwb12", devices[1].name);
-    EXPECT_EQ(12u, devices[1].phy_index);
-    EXPECT_EQ(2, log_.Count(android::base::ERROR,
-                            "operator(): Incorrect attr in NL802154_CMD_GET_INTERFACE dump", kTag))
-        << log_.Text();
+    EXPECT_EQ(List(), (Listing{{"wpan0", 0}, {"wpan1", 1}, {"uwb12", 12}}));
   }
+
+  // A removed interface goes with its veth.
+  ASSERT_TRUE(devices_.RemoveDevice("wpan0"));
+  EXPECT_EQ(0u, if_nametoindex("wpan0"));
+  EXPECT_EQ(List(), (Listing{{"wpan1", 1}, {"uwb12", 12}}));
+  std::string error;
+  EXPECT_FALSE(devices_.AddDevice({"uwb12", 5}, &error));  // the name is taken
 }
 
 TEST_F(Nl802154FamilyTest, PhyChannelsComeFromTheUwbPageOnlyAndAreAppended) {
@@ -93,102 +107,71 @@ TEST_F(Nl802154FamilyTest, PhyChannelsComeFromTheUwbPageOnlyAndAreAppended) {
   narrowband.pages = {{0, {11, 26}}, {2, {1}}};
   Add(uwb);
   Add(narrowband);
-  const struct {
-    const char* iface;
-    uint32_t phy;
-    std::vector<int> channels;
-  } cases[] = {{"wpan0", 7, {2, 9, 5, 6}}, {"wpan1", 8, {2}}};
-  for (const auto& c : cases) {
-    PhyInfo info;
-    info.channels = {2};  // kept: the channels are added to what the caller has
-    EXPECT_TRUE(utils_.GetPhyInfo(c.iface, &info)) << c.iface;
-    EXPECT_EQ(c.phy, info.phy_index);
-    EXPECT_EQ(c.channels, info.channels);
-  }
+  PhyInfo info;
+  info.channels = {2};  // kept: the channels are added to what the caller has
+  EXPECT_TRUE(utils_.GetPhyInfo("wpan0", &info));
+  EXPECT_EQ(7u, info.phy_index);
+  EXPECT_EQ((std::vector<int>{2, 9, 5, 6}), info.channels);
+  info.channels.clear();
+  EXPECT_TRUE(utils_.GetPhyInfo("wpan1", &info));  // no UWB page: nothing to add
+  EXPECT_EQ(8u, info.phy_index);
+  EXPECT_TRUE(info.channels.empty());
 }
 
-TEST_F(Nl802154FamilyTest, ChannelsOutOfRangeAreRefusedBeforeSending) {
+TEST_F(Nl802154FamilyTest, RefusedBeforeSendingOrByTheDriver) {
   WpanDeviceConfig config{"wpan0", 0};
   config.pages = {{0, {3}}, {4, {0, 5, 9, 15}}};
   Add(config);
-  for (int channel : {0, 15, 9}) {
+  for (int channel : {0, 15}) {
     EXPECT_TRUE(utils_.SetChannel("wpan0", channel)) << channel;
-    EXPECT_EQ(kNl802154UwbPage, Device("wpan0").page);
     EXPECT_EQ(channel, Device("wpan0").channel);
   }
-  EXPECT_TRUE(log_.Contains(android::base::INFO, "SetChannel: Set channel to 15", kTag));
+  EXPECT_EQ(kNl802154UwbPage, Device("wpan0").page);
   const int sent = family_.request_count();
   EXPECT_FALSE(utils_.SetChannel("wpan0", 16));
   EXPECT_FALSE(utils_.SetChannel("wpan0", -1));
-  EXPECT_EQ(sent, family_.request_count());
-  // In range, but not a channel of the UWB page: the driver refuses it.
-  EXPECT_FALSE(utils_.SetChannel("wpan0", 3));
-  EXPECT_EQ(sent + 1, family_.request_count());
-  EXPECT_TRUE(log_.Contains(android::base::WARNING, NlError("SendAndAwaitAck", EINVAL)))
-      << log_.Text();
-  EXPECT_EQ(9, Device("wpan0").channel);
-}
-
-TEST_F(Nl802154FamilyTest, PanIdAndShortAddressAreKeptWhileTheInterfaceIsDown) {
-  Add({"wpan0", 0});
-  Add({"wpan1", 1});
-  EXPECT_TRUE(utils_.SetPanId("wpan1", 0xcafe));
-  EXPECT_TRUE(utils_.SetShortMacAddress("wpan1", {0xab, 0xcd}));
-  EXPECT_EQ(0xcafe, Device("wpan1").pan_id);
-  EXPECT_EQ(0xabcd, Device("wpan1").short_address);
-  EXPECT_EQ(0xffff, Device("wpan0").pan_id);
-  EXPECT_TRUE(log_.Contains(android::base::INFO, "SetPanId: Set pan id to 51966", kTag));
-
-  const int sent = family_.request_count();
-  EXPECT_FALSE(utils_.SetShortMacAddress("wpan1", {1, 2, 3}));
-  EXPECT_EQ(sent, family_.request_count());
-  EXPECT_TRUE(log_.Contains(android::base::ERROR,
-                            "SetShortMacAddress: Incorrect short address, size is 3", kTag));
-
-  ASSERT_TRUE(interface_tool_.SetUpState("wpan1", true));
-  EXPECT_FALSE(utils_.SetPanId("wpan1", 7));
-  EXPECT_FALSE(utils_.SetShortMacAddress("wpan1", {0, 7}));
-  EXPECT_EQ(2, log_.Count(android::base::WARNING, NlError("SendAndAwaitAck", EBUSY)))
-      << log_.Text();
-  EXPECT_EQ(0xcafe, Device("wpan1").pan_id);
-  EXPECT_EQ(0xabcd, Device("wpan1").short_address);
-}
-
-TEST_F(Nl802154FamilyTest, UnknownInterfaceIsRefused) {
-  Add({"wpan0", 0});
-  // No interface of that name at all: nothing reaches the driver.
-  const int sent = family_.request_count();
+  EXPECT_FALSE(utils_.SetShortMacAddress("wpan0", {1, 2, 3}));
+  // No interface of that name at all.
   PhyInfo info;
   EXPECT_FALSE(utils_.GetPhyInfo("wpan9", &info));
   EXPECT_FALSE(utils_.SetChannel("wpan9", 5));
   EXPECT_FALSE(utils_.SetPanId("wpan9", 1));
   EXPECT_FALSE(utils_.SetShortMacAddress("wpan9", {0, 1}));
   EXPECT_EQ(sent, family_.request_count());
-  EXPECT_EQ(4, log_.Count(android::base::ERROR,
+  EXPECT_TRUE(log_.Contains(ERROR, "SetShortMacAddress: Incorrect short address, size is 3", kTag));
+  EXPECT_EQ(4, log_.Count(ERROR,
                           std::string("SetIeeeCommand: Failed to resolve iface wpan9: ") +
                               strerror(ENODEV),
                           kTag));
 
-  // An interface the kernel has but the driver does not: the driver refuses.
+  // In range but not on the UWB page, or on "lo", real but not the driver's.
+  EXPECT_FALSE(utils_.SetChannel("wpan0", 3));
   EXPECT_FALSE(utils_.GetPhyInfo("lo", &info));
   EXPECT_FALSE(utils_.SetChannel("lo", 5));
-  EXPECT_EQ(sent + 2, family_.request_count());
-  EXPECT_TRUE(log_.Contains(android::base::WARNING, NlError("SendAndAwaitResponse", ENODEV)))
-      << log_.Text();
+  EXPECT_EQ(sent + 3, family_.request_count());
+  EXPECT_EQ(15, Device("wpan0").channel);
+  EXPECT_TRUE(log_.Contains(WARNING, NlError("SendAndAwaitAck", EINVAL))) << log_.Text();
+  EXPECT_TRUE(log_.Contains(WARNING, NlError("SendAndAwaitResponse", ENODEV))) << log_.Text();
+  EXPECT_FALSE(interface_tool_.SetMacAddress("lo", MacAddress{}));
+  EXPECT_EQ(MacAddress{}, interface_tool_.GetFactoryMacAddress("lo"));
+  EXPECT_EQ(1, log_.Count(ERROR, MacAddressError("lo", ENODEV), kToolTag)) << log_.Text();
 }
 
-TEST_F(Nl802154FamilyTest, RemovedInterfaceDisappearsWithItsVeth) {
-  Add({"wpan0", 0});
-  Add({"wpan1", 1});
-  EXPECT_EQ(if_nametoindex("wpan0"), Device("wpan0").ifindex);
-  ASSERT_TRUE(devices_.RemoveDevice("wpan0"));
-  EXPECT_EQ(0u, if_nametoindex("wpan0"));
-  bool ok = false;
-  const std::vector<DevInfo> devices = utils_.ListDevices(&ok);
-  ASSERT_EQ(1u, devices.size());
-  EXPECT_EQ("wpan1", devices[0].name);
-  std::string error;
-  EXPECT_FALSE(devices_.AddDevice({"wpan1", 5}, &error));  // the name is taken
+// As in the kernel, an interface takes new addresses only while it is down.
+TEST_F(Nl802154FamilyTest, AddressesAreRefusedWhileTheInterfaceIsUp) {
+  WpanDeviceConfig config{"wpan0", 0};
+  config.factory_address = {0x10, 0x20, 0x30, 0x40, 0x50, 0x60, 0x70, 0x80};
+  Add(config);
+  EXPECT_EQ(config.factory_address, interface_tool_.GetFactoryMacAddress("wpan0"));
+  ASSERT_TRUE(interface_tool_.SetUpState("wpan0", true));
+  EXPECT_FALSE(utils_.SetPanId("wpan0", 7));
+  EXPECT_FALSE(utils_.SetShortMacAddress("wpan0", {0, 7}));
+  EXPECT_FALSE(interface_tool_.SetMacAddress("wpan0", config.factory_address));
+  const WpanDevice device = Device("wpan0");
+  EXPECT_EQ(std::make_tuple(0xffff, 0xffff, MacAddress{}),
+            std::make_tuple(device.pan_id, device.short_address, device.extended_address));
+  EXPECT_EQ(2, log_.Count(WARNING, NlError("SendAndAwaitAck", EBUSY))) << log_.Text();
+  EXPECT_EQ(1, log_.Count(ERROR, MacAddressError("wpan0", EBUSY), kToolTag)) << log_.Text();
 }
 
 }  // namespace

@@ -1,5 +1,6 @@
 #include <cstdint>
 #include <iterator>
+#include <map>
 #include <vector>
 
 #include <gtest/gtest.h>
@@ -15,18 +16,13 @@ namespace hardware {
 namespace dalix {
 namespace {
 
-// clang-format off
 // Bytes that nla_get_* reads for an integer type; 0 for anything else.
 int Width(uint16_t type) {
-  switch (type) {
-    case NLA_U8: case NLA_S8: return 1;
-    case NLA_U16: case NLA_S16: return 2;
-    case NLA_U32: case NLA_S32: return 4;
-    case NLA_U64: case NLA_S64: return 8;
-  }
-  return 0;
+  const std::map<uint16_t, int> widths = {{NLA_U8, 1},  {NLA_S8, 1},  {NLA_U16, 2}, {NLA_S16, 2},
+                                          {NLA_U32, 4}, {NLA_S32, 4}, {NLA_U64, 8}, {NLA_S64, 8}};
+  auto width = widths.find(type);
+  return width == widths.end() ? 0 : width->second;
 }
-// clang-format on
 
 // A policy indexed by attribute id, its last entry the nest's maximum id.
 struct Policy {

@@ -1,6 +1,4 @@
 #include <fstream>
-#include <memory>
-#include <optional>
 #include <string>
 #include <type_traits>
 #include <vector>
@@ -14,18 +12,8 @@ namespace {
 
 namespace uwb = ::aidl::aidl::hardware::dalix::uwb;
 
-// The signatures service code is written against, checked at build time.
+// What the platform's back end makes of the package, checked at build time.
 static_assert(std::is_same_v<std::underlying_type_t<uwb::AoaType>, int8_t>);
-static_assert(std::is_same_v<decltype(&uwb::IFiraController::addControlees),
-                             ndk::ScopedAStatus (uwb::IFiraController::*)(
-                                 int32_t, const std::vector<uwb::UwbAddress>&,
-                                 const std::optional<std::vector<int32_t>>&)>);
-static_assert(std::is_same_v<decltype(&uwb::IUwb::getIface),
-                             ndk::ScopedAStatus (uwb::IUwb::*)(const std::string&,
-                                                               std::shared_ptr<uwb::IUwbIface>*)>);
-static_assert(std::is_same_v<decltype(&uwb::ICccController::startCccSession),
-                             ndk::ScopedAStatus (uwb::ICccController::*)(int32_t, int64_t, int32_t,
-                                                                         int64_t*)>);
 static_assert(uwb::IFiraController::TRANSACTION_reset == FIRST_CALL_TRANSACTION + 14);
 
 // Values without a name print as signed numbers; the full session below

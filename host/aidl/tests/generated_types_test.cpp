@@ -16,12 +16,9 @@ namespace uwb = ::aidl::aidl::hardware::dalix::uwb;
 static_assert(std::is_same_v<std::underlying_type_t<uwb::AoaType>, int8_t>);
 static_assert(uwb::IFiraController::TRANSACTION_reset == FIRST_CALL_TRANSACTION + 14);
 
-// Values without a name print as signed numbers; the full session below
-// prints one named value of each enumeration.
-TEST(GeneratedTypesTest, EnumerationsAndSmallParcelablesPrint) {
-  EXPECT_EQ("2", toString(uwb::RframeConfig(2)));
-  EXPECT_EQ("-1", toString(uwb::PsduDataRate(-1)));
-  EXPECT_EQ("-128", toString(uwb::AoaType(-128)));
+// The full session below prints one named value of each enumeration; the
+// service's refusals print values without a name.
+TEST(GeneratedTypesTest, EnumerationsListTheirValuesAndParcelablesCompare) {
   std::vector<std::string> names;
   for (uwb::RframeConfig value : ndk::enum_range<uwb::RframeConfig>()) {
     names.push_back(toString(value));

@@ -17,58 +17,55 @@ std::string Aidl(const std::string& body) {
   return "<manifest><hal format='aidl'><name>a.b</name>" + body + "</hal></manifest>";
 }
 
-struct ManifestCase {
-  const char* name;
-  std::string xml;
-  const char* declared = nullptr;      // declared, at |version|, as the first instance
-  const char* not_declared = nullptr;  // not declared; null: the manifest must not load
-  int version = 0;
-};
-
-const ManifestCase kCases[] = {
-    {"FqName", Aidl("<version>2</version><fqname>IFoo/default</fqname>"), "a.b.IFoo/default",
-     "a.b.IFoo/other", 2},
-    {"InterfaceBlock",
-     Aidl("<interface><name>IFoo</name><instance>x</instance><instance>y</instance></interface>"),
-     "a.b.IFoo/x", "a.c.IFoo/y", 1},
-    {"HidlEntriesDeclareNoAidl",
-     "<manifest><hal format='hidl'><name>a.b</name><fqname>@1.0::IFoo/default</fqname></hal>"
-     "</manifest>",
-     nullptr, "a.b.IFoo/default"},
-    {"NotWellFormed", "<manifest><hal format='aidl'><name>a.b</name></manifest>"},
-    {"WrongRoot", "<compatibility-matrix/>"},
-    {"VersionNotANumber", Aidl("<version>1x</version><fqname>IFoo/default</fqname>")},
-    {"VersionZero", Aidl("<version>0</version><fqname>IFoo/default</fqname>")},
-    {"FqNameWithoutInstance", Aidl("<fqname>IFoo/</fqname>")},
-    {"NoInstance", Aidl("")},
-};
-
-class VintfManifestTest : public ::testing::TestWithParam<ManifestCase> {};
-
-TEST_P(VintfManifestTest, Loads) {
-  const ManifestCase& c = GetParam();
-  char path[] = "/tmp/vintf_manifest_test_XXXXXX";
-  const int fd = mkstemp(path);
-  ASSERT_GE(fd, 0);
-  ASSERT_EQ(static_cast<ssize_t>(c.xml.size()), write(fd, c.xml.data(), c.xml.size()));
+// Loads |xml| from a file as the service manager does.
+std::optional<VintfManifest> Load(const std::string& xml, std::string* path, std::string* error) {
+  char name[] = "/tmp/vintf_manifest_test_XXXXXX";
+  const int fd = mkstemp(name);
+  *path = name;
+  if (fd < 0 || write(fd, xml.data(), xml.size()) != static_cast<ssize_t>(xml.size())) return {};
   close(fd);
-  std::string error;
-  std::optional<VintfManifest> manifest = VintfManifest::Load(path, &error);
-  unlink(path);
-  ASSERT_EQ(c.not_declared != nullptr, manifest.has_value()) << error;
-  if (!manifest.has_value()) {
-    EXPECT_NE(std::string::npos, error.find(path)) << error;
-    return;
-  }
-  if (c.declared != nullptr) {
-    EXPECT_TRUE(manifest->Declares(c.declared));
-    EXPECT_EQ(c.declared, manifest->instances().front().Name());
-    EXPECT_EQ(c.version, manifest->instances().front().version);
-  }
-  EXPECT_FALSE(manifest->Declares(c.not_declared));
+  std::optional<VintfManifest> manifest = VintfManifest::Load(name, error);
+  unlink(name);
+  return manifest;
 }
 
-INSTANTIATE_TEST_SUITE_P(Manifests, VintfManifestTest, ::testing::ValuesIn(kCases),
-                         [](const auto& info) { return std::string(info.param.name); });
+TEST(VintfManifestTest, DeclaresTheAidlInstancesOfAWellFormedManifestOnly) {
+  const struct {
+    std::string xml;
+    const char* declared = nullptr;      // declared, at |version|, as the first instance
+    const char* not_declared = nullptr;  // not declared; null: the manifest must not load
+    int version = 0;
+  } cases[] = {
+      {Aidl("<version>2</version><fqname>IFoo/default</fqname>"), "a.b.IFoo/default",
+       "a.b.IFoo/other", 2},
+      {Aidl("<interface><name>IFoo</name><instance>x</instance><instance>y</instance></interface>"),
+       "a.b.IFoo/x", "a.c.IFoo/y", 1},
+      {"<manifest><hal format='hidl'><name>a.b</name><fqname>@1.0::IFoo/default</fqname></hal>"
+       "</manifest>",
+       nullptr, "a.b.IFoo/default"},
+      {"<manifest><hal format='aidl'><name>a.b</name></manifest>"},  // not well-formed
+      {"<compatibility-matrix/>"},
+      {Aidl("<version>1x</version><fqname>IFoo/default</fqname>")},
+      {Aidl("<version>0</version><fqname>IFoo/default</fqname>")},
+      {Aidl("<fqname>IFoo/</fqname>")},
+      {Aidl("")},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.xml);
+    std::string path, error;
+    std::optional<VintfManifest> manifest = Load(c.xml, &path, &error);
+    ASSERT_EQ(c.not_declared != nullptr, manifest.has_value()) << error;
+    if (!manifest.has_value()) {
+      EXPECT_NE(std::string::npos, error.find(path)) << error;
+      continue;
+    }
+    if (c.declared != nullptr) {
+      EXPECT_TRUE(manifest->Declares(c.declared));
+      EXPECT_EQ(c.declared, manifest->instances().front().Name());
+      EXPECT_EQ(c.version, manifest->instances().front().version);
+    }
+    EXPECT_FALSE(manifest->Declares(c.not_declared));
+  }
+}
 
 }  // namespace

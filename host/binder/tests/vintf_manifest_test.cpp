@@ -1,8 +1,7 @@
 #include "vintf_manifest.h"
 
-#include <stdlib.h>
-#include <unistd.h>
-
+#include <cstdio>
+#include <fstream>
 #include <optional>
 #include <string>
 
@@ -15,18 +14,6 @@ using ndk::host::VintfManifest;
 // An AIDL entry of package a.b with |body| inside.
 std::string Aidl(const std::string& body) {
   return "<manifest><hal format='aidl'><name>a.b</name>" + body + "</hal></manifest>";
-}
-
-// Loads |xml| from a file as the service manager does.
-std::optional<VintfManifest> Load(const std::string& xml, std::string* path, std::string* error) {
-  char name[] = "/tmp/vintf_manifest_test_XXXXXX";
-  const int fd = mkstemp(name);
-  *path = name;
-  if (fd < 0 || write(fd, xml.data(), xml.size()) != static_cast<ssize_t>(xml.size())) return {};
-  close(fd);
-  std::optional<VintfManifest> manifest = VintfManifest::Load(name, error);
-  unlink(name);
-  return manifest;
 }
 
 TEST(VintfManifestTest, DeclaresTheAidlInstancesOfAWellFormedManifestOnly) {
@@ -50,10 +37,12 @@ TEST(VintfManifestTest, DeclaresTheAidlInstancesOfAWellFormedManifestOnly) {
       {Aidl("<fqname>IFoo/</fqname>")},
       {Aidl("")},
   };
+  const std::string path = ::testing::TempDir() + "vintf_manifest_test.xml";
   for (const auto& c : cases) {
     SCOPED_TRACE(c.xml);
-    std::string path, error;
-    std::optional<VintfManifest> manifest = Load(c.xml, &path, &error);
+    std::ofstream(path) << c.xml;
+    std::string error;
+    std::optional<VintfManifest> manifest = VintfManifest::Load(path, &error);
     ASSERT_EQ(c.not_declared != nullptr, manifest.has_value()) << error;
     if (!manifest.has_value()) {
       EXPECT_NE(std::string::npos, error.find(path)) << error;
@@ -66,6 +55,7 @@ TEST(VintfManifestTest, DeclaresTheAidlInstancesOfAWellFormedManifestOnly) {
     }
     EXPECT_FALSE(manifest->Declares(c.not_declared));
   }
+  std::remove(path.c_str());
 }
 
 }  // namespace

@@ -5,13 +5,7 @@
 #include <cstdint>
 
 #include "fuzz/generic_message.h"
-#include "fuzz/scripted_driver.h"
 #include "net/ccc_region_utils.h"
-
-extern "C" int LLVMFuzzerInitialize(int* /*argc*/, char*** /*argv*/) {
-  hardware::dalix::fuzz::SilenceLogs();
-  return 0;
-}
 
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   hardware::dalix::UniqueNlMsg msg;

@@ -1,6 +1,5 @@
 #include <optional>
 #include <string>
-#include <vector>
 
 #include "fuzz/generic_message.h"
 #include "fuzz/seed_recorder.h"
@@ -17,13 +16,9 @@ bool WriteSeeds(hardware::dalix::fuzz::SeedRecorder& recorder) {
   for (std::optional<uint8_t> code :
        {std::optional<uint8_t>(1), std::optional<uint8_t>(0), std::optional<uint8_t>()}) {
     UniqueNlMsg msg = sim::DriverSimulator::NewEvent(0x1a, MCPS802154_CMD_TESTMODE);
-    std::vector<uint8_t> seed;
-    if (sim::CccTestModeSim::EncodeTestModeReply(msg.get(), 0, code)) {
-      seed = hardware::dalix::fuzz::SeedOf(msg.get());
-    }
-    written &= !seed.empty() &&
+    written &= sim::CccTestModeSim::EncodeTestModeReply(msg.get(), 0, code) &&
                recorder.Write("code_" + (code ? std::to_string(*code) : std::string("none")),
-                              std::string(seed.begin(), seed.end()));
+                              hardware::dalix::fuzz::SeedOf(msg.get()));
   }
   return written;
 }

@@ -9,15 +9,9 @@
 
 #include <android-base/logging.h>
 
-#include "fuzz/scripted_driver.h"
 #include "net/config_utils.h"
 
 using hardware::dalix::ConfigUtils;
-
-extern "C" int LLVMFuzzerInitialize(int* /*argc*/, char*** /*argv*/) {
-  hardware::dalix::fuzz::SilenceLogs();
-  return 0;
-}
 
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   static int fd = memfd_create("config", MFD_CLOEXEC);

@@ -2,18 +2,15 @@
 // notification and ranging-data parsing, ParseMeasurements and
 // ParseAntennaMeasurement, as the ranging socket's handler runs them.
 //
-// Structure-aware: the input's first byte is the generic netlink command,
-// the rest the message's attributes, so that mutations land in the nests
-// rather than in headers the socket layer would have rejected. Radios 0 to 3
-// have a callback; radio 1 has its antenna pairs configured.
+// The input is one notification in the form of fuzz/generic_message.h, so
+// that mutations land in the nests rather than in headers the socket layer
+// would have rejected. Radios 0 to 3 have a callback; radio 1 has its antenna
+// pairs configured.
 #include <cstddef>
 #include <cstdint>
 #include <vector>
 
-#include <netlink/genl/genl.h>
-#include <netlink/msg.h>
-
-#include "fuzz/scripted_driver.h"
+#include "fuzz/generic_message.h"
 #include "net/config_utils.h"
 #include "net/fira_callback.h"
 #include "net/fira_region_utils.h"
@@ -56,17 +53,10 @@ FiraRegionUtils& Fira() {
 
 }  // namespace
 
-extern "C" int LLVMFuzzerInitialize(int* /*argc*/, char*** /*argv*/) {
-  hardware::dalix::fuzz::SilenceLogs();
-  return 0;
-}
-
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
-  if (size < 1 || size > 8192) return 0;
-  nl_msg* msg = nlmsg_alloc_size(NLMSG_HDRLEN + GENL_HDRLEN + NLMSG_ALIGN(size));
-  genlmsg_put(msg, 0, 0, 0x1d, 0, 0, data[0], 1);
-  nlmsg_append(msg, const_cast<uint8_t*>(data + 1), size - 1, 0);
-  Fira().OnRangingResult(msg);
-  nlmsg_free(msg);
+  hardware::dalix::UniqueNlMsg msg;
+  if (hardware::dalix::fuzz::FrameGenericMessage(data, size, 0x1d, &msg)) {
+    Fira().OnRangingResult(msg.get());
+  }
   return 0;
 }

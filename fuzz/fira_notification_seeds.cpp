@@ -1,5 +1,4 @@
-#include <netlink/genl/genl.h>
-
+#include "fuzz/generic_message.h"
 #include "fuzz/seed_recorder.h"
 #include "net/fira_region.h"
 #include "sim/fira_notification.h"
@@ -16,10 +15,7 @@ namespace {
 std::string Input(const sim::FiraNotificationData& data) {
   UniqueNlMsg msg;
   if (!sim::EncodeFiraNotification(msg.get(), 0x1d, data)) return std::string();
-  nlmsghdr* header = nlmsg_hdr(msg.get());
-  const auto* attrs = reinterpret_cast<const char*>(genlmsg_attrdata(genlmsg_hdr(header), 0));
-  return std::string(1, static_cast<char>(genlmsg_hdr(header)->cmd)) +
-         std::string(attrs, genlmsg_attrlen(genlmsg_hdr(header), 0));
+  return hardware::dalix::fuzz::SeedOf(msg.get());
 }
 
 }  // namespace

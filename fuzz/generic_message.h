@@ -8,7 +8,7 @@
 #include <stddef.h>
 #include <stdint.h>
 
-#include <vector>
+#include <string>
 
 #include <netlink/genl/genl.h>
 #include <netlink/msg.h>
@@ -29,12 +29,11 @@ inline bool FrameGenericMessage(const uint8_t* data, size_t size, int family, Un
 }
 
 // The seed form of an encoded message: its command, then its attributes.
-inline std::vector<uint8_t> SeedOf(nl_msg* msg) {
+inline std::string SeedOf(nl_msg* msg) {
   genlmsghdr* genl = genlmsg_hdr(nlmsg_hdr(msg));
-  const auto* attrs = reinterpret_cast<const uint8_t*>(genlmsg_attrdata(genl, 0));
-  std::vector<uint8_t> seed = {genl->cmd};
-  seed.insert(seed.end(), attrs, attrs + genlmsg_attrlen(genl, 0));
-  return seed;
+  const auto* attrs = reinterpret_cast<const char*>(genlmsg_attrdata(genl, 0));
+  return std::string(1, static_cast<char>(genl->cmd)) +
+         std::string(attrs, genlmsg_attrlen(genl, 0));
 }
 
 }  // namespace fuzz

@@ -10,11 +10,6 @@ using hardware::dalix::IeeeUtils;
 using hardware::dalix::PhyInfo;
 using hardware::dalix::fuzz::ScriptedDriver;
 
-extern "C" int LLVMFuzzerInitialize(int* /*argc*/, char*** /*argv*/) {
-  hardware::dalix::fuzz::SilenceLogs();
-  return 0;
-}
-
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   static ScriptedDriver driver;
   driver.Load(data, size);

@@ -15,11 +15,6 @@ using hardware::dalix::fuzz::ScriptedDriver;
 // Shared with the seed program, which must send the same keys.
 ConfigUtils* CalibrationStore();
 
-extern "C" int LLVMFuzzerInitialize(int* /*argc*/, char*** /*argv*/) {
-  hardware::dalix::fuzz::SilenceLogs();
-  return 0;
-}
-
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   static ScriptedDriver driver;
   static ConfigUtils* store = CalibrationStore();

@@ -12,7 +12,6 @@
 #include <memory>
 
 #include "fuzz/generic_message.h"
-#include "fuzz/scripted_driver.h"
 #include "net/mcps_utils.h"
 
 namespace hardware {
@@ -61,11 +60,6 @@ McpsUtils* RangingMcpsUtils() {
 }  // namespace
 }  // namespace dalix
 }  // namespace hardware
-
-extern "C" int LLVMFuzzerInitialize(int* /*argc*/, char*** /*argv*/) {
-  hardware::dalix::fuzz::SilenceLogs();
-  return 0;
-}
 
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   using namespace hardware::dalix;

@@ -1,6 +1,5 @@
 #include <optional>
 #include <string>
-#include <vector>
 
 #include "fuzz/generic_message.h"
 #include "fuzz/seed_recorder.h"
@@ -24,12 +23,9 @@ bool WriteSeeds(hardware::dalix::fuzz::SeedRecorder& recorder) {
   int index = 0;
   for (const sim::RangingReport& report : reports) {
     UniqueNlMsg msg = sim::DriverSimulator::NewEvent(0x1a, MCPS802154_CMD_RANGING_REPORT);
-    std::vector<uint8_t> seed;
-    if (sim::SimpleRangingSim::EncodeRangingReport(msg.get(), 0, report)) {
-      seed = hardware::dalix::fuzz::SeedOf(msg.get());
-    }
-    written &= !seed.empty() && recorder.Write("report_" + std::to_string(index++),
-                                               std::string(seed.begin(), seed.end()));
+    written &= sim::SimpleRangingSim::EncodeRangingReport(msg.get(), 0, report) &&
+               recorder.Write("report_" + std::to_string(index++),
+                              hardware::dalix::fuzz::SeedOf(msg.get()));
   }
   return written;
 }

@@ -5,8 +5,6 @@
 #include <sys/socket.h>
 
 #include <cerrno>
-#include <cstdio>
-#include <cstdlib>
 #include <cstring>
 
 #include <android-base/logging.h>
@@ -117,15 +115,6 @@ void ScriptedDriver::AppendDatagram(std::string* script, const uint8_t* data, si
 }
 
 void ScriptedDriver::AppendEndOfAnswer(std::string* script) { script->append(2, '\0'); }
-
-void SilenceLogs() {
-  android::base::SetLogger([](android::base::LogId, android::base::LogSeverity, const char*,
-                              const char*, unsigned int, const char*) {});
-  android::base::SetAborter([](const char* message) {
-    fprintf(stderr, "%s\n", message);
-    abort();
-  });
-}
 
 }  // namespace fuzz
 }  // namespace dalix

@@ -48,10 +48,6 @@ class ScriptedDriver {
   std::unique_ptr<NlSocketFactory> factory_;
 };
 
-// Sends every log line of the process nowhere: a fuzzer runs millions of
-// exchanges, and the lines are still formatted, so their code runs.
-void SilenceLogs();
-
 }  // namespace fuzz
 }  // namespace dalix
 }  // namespace hardware

@@ -17,6 +17,7 @@
 #include "net/fira_region.h"
 #include "sim/fira_notification.h"
 #include "tests/fira_callback_recorder.h"
+#include "tests/fira_session_builder.h"
 #include "tests/log_capture.h"
 #include "tests/mock_nl_socket.h"
 #include "tests/sent_message.h"
@@ -56,39 +57,28 @@ std::vector<uint8_t> Param(int attr, uint32_t value) {
 // A driver-controller session (interface value 1) that sets most switches,
 // and what it sends on a radio without antenna properties.
 Session BaseSession() {
-  Session s;
-  s.id = 42;
+  Session s = ValidFiraSession(42, {0x5678, 0x9abc});
   s.deviceType = uwb::DeviceType(1);
   s.deviceRole = uwb::DeviceRole(1);
-  s.rangingRoundUsage = uwb::RangingRoundUsage(2);
   s.multiNodeMode = uwb::MultiNodeMode(1);
-  s.deviceAddress = {{0x12, 0x34}};
-  s.destAddressList = {{{0x56, 0x78}}, {{0x9a, 0xbc}}};
   s.initiationTimeMs = 10;
-  s.slotDurationRstu = 2400;
-  s.slotsPerRangingRound = 25;
-  s.rangingBlockDurationMs = 200;
   s.blockStridingValue = 3;
   s.maxRangingRoundRetries = 5;
   s.isHoppingEnabled = true;
   s.sessionPriority = 50;
   s.rangingRoundControl.hasResultReportPhase = true;
-  s.inBandTerminationAttemptCount = 1;
-  s.channelNumber = 9;
-  s.preambleCodeIndex = 10;
   s.rframeConfig = uwb::RframeConfig(3);
   s.preambleDuration = uwb::PreambleDuration(1);
   s.sfdId = 2;
   s.stsSegmentCount = 1;
   s.bprfPhrDataRate = uwb::BprfPhrDataRate(1);
-  s.stsConfig = uwb::FiraStsConfig(1);
   s.subSessionId = 7;
   s.aoaResultRequest = uwb::AoaResultRequest(1);
   s.resultReportConfig = {true, true, false, true};
   return s;
 }
 const std::map<int, uint32_t> kBaseParams = {
-    {1, 0},   {2, 1},   {3, 2},  {4, 1},  {5, 0x1234}, {6, 0x5678}, {7, 10}, {8, 2400},
+    {1, 0},   {2, 1},   {3, 2},  {4, 1},  {5, 0x0001}, {6, 0x5678}, {7, 10}, {8, 2400},
     {9, 200}, {10, 25}, {12, 5}, {13, 1}, {15, 50},    {18, 0},     {19, 1}, {20, 9},
     {21, 10}, {22, 3},  {23, 0}, {25, 2}, {26, 1},     {27, 0},     {28, 1}, {34, 1},
     {32, 0},  {36, 1},  {43, 1}, {44, 1}, {45, 1},     {47, 1}};
@@ -116,6 +106,17 @@ void PutBadlySizedNotification(nl_msg* m, bool bad_index) {
   for (nlattr* nest : {aoa, second, list, data, params}) nla_nest_end(m, nest);
 }
 
+// A result of session 77 on |kHw| with |measurements|.
+FiraNotificationData Result(std::vector<FiraMeasurementData> measurements) {
+  FiraNotificationData d;
+  d.hw_index = kHw;
+  d.session_id = 77;
+  d.index = 5;
+  d.timestamp_ns = 123456789;
+  d.measurements = std::move(measurements);
+  return d;
+}
+
 class FiraRegionUtilsTest : public ::testing::Test {
  protected:
   void SetUp() override { fira_.SetMcpsNetId(kFamily); }
@@ -134,13 +135,13 @@ class FiraRegionUtilsTest : public ::testing::Test {
   }
 
   // Checks the framing of the last request; its CALL_PARAMS children.
-  std::vector<nlattr*> CallParams(uint8_t call, uint32_t hw = kHw) {
+  std::vector<nlattr*> CallParams(uint8_t call) {
     SentMessage& sent = sent_.back();
     EXPECT_EQ(sent.header()->nlmsg_type, kFamily);
     EXPECT_EQ(sent.cmd(), MCPS802154_CMD_CALL_REGION);
     std::vector<nlattr*> top = sent.Attrs();
     EXPECT_EQ(top.size(), 3u);
-    EXPECT_EQ(SentMessage::Payload(top[0]), SentMessage::Bytes(hw));
+    EXPECT_EQ(SentMessage::Payload(top[0]), SentMessage::Bytes(kHw));
     EXPECT_EQ(SentMessage::Payload(top[1]), SentMessage::StringBytes("endless"));
     // Plain type words: no NLA_F_NESTED in any FiRa nest.
     EXPECT_EQ(top[2]->nla_type, MCPS802154_ATTR_SCHEDULER_REGION_CALL);
@@ -179,7 +180,6 @@ TEST_F(FiraRegionUtilsTest, ConfigTwrSessionSendsExactlyTheParametersTheSessionC
     const char* name;
     std::function<void(Session&)> change;
     std::map<int, int64_t> delta;  // -1: not sent
-    uint32_t hw = kHw;
   } cases[] = {
       {"base", [](Session&) {}, {}},
       {"driver controlee: no destination, its report phases",
@@ -219,10 +219,6 @@ TEST_F(FiraRegionUtilsTest, ConfigTwrSessionSendsExactlyTheParametersTheSessionC
        },
        {{2, 0}, {33, 255}, {35, 1}}},
       {"both", [](Session& s) { s.aoaType = uwb::AoaType(2); }, {{33, 255}, {35, 0}}},
-      {"configured hardware",
-       [](Session& s) { s.aoaType = uwb::AoaType(2); },
-       {{32, 2}, {33, 3}, {34, 8}, {35, 0}},
-       kHw + 1},
       {"other switches",
        [](Session& s) {
          s.isKeyRotationEnabled = s.isTxAdaptivePayloadPowerEnabled = true;
@@ -243,10 +239,6 @@ TEST_F(FiraRegionUtilsTest, ConfigTwrSessionSendsExactlyTheParametersTheSessionC
        },
        {{19, 0xffffffff}, {20, 9}, {15, 200}}},
   };
-  config_.Set("antenna_pair_azimuth", "2");
-  config_.Set("antenna_pair_elevation", "3");
-  config_.Set("tx_antenna", "3");
-  ASSERT_TRUE(fira_.SetProperties(kHw + 1, config_));
   for (const auto& c : cases) {
     SCOPED_TRACE(c.name);
     Session session = BaseSession();
@@ -260,8 +252,8 @@ TEST_F(FiraRegionUtilsTest, ConfigTwrSessionSendsExactlyTheParametersTheSessionC
     for (auto [attr, value] : params) expected[attr] = Param(attr, value);
     if (c.delta.count(38)) expected[38] = {1, 2, 3, 4, 5, 6, 0xa, 0xb};
     ExpectSocket();
-    ASSERT_TRUE(fira_.ConfigTwrSession(c.hw, session));
-    std::vector<nlattr*> call = CallParams(FIRA_CALL_SESSION_SET_PARAMS, c.hw);
+    ASSERT_TRUE(fira_.ConfigTwrSession(kHw, session));
+    std::vector<nlattr*> call = CallParams(FIRA_CALL_SESSION_SET_PARAMS);
     ASSERT_EQ(call.size(), 2u);
     EXPECT_EQ(SentMessage::Payload(call[0]), SentMessage::Bytes<uint32_t>(42));
     Attrs sent;
@@ -275,8 +267,6 @@ TEST_F(FiraRegionUtilsTest, ConfigTwrSessionSendsExactlyTheParametersTheSessionC
     }
     EXPECT_EQ(sent, expected);
   }
-  ExpectSocket(false);
-  EXPECT_FALSE(fira_.ConfigTwrSession(kHw, BaseSession()));
 }
 
 TEST_F(FiraRegionUtilsTest, ValueChecksRefuseWithTheirLineAndSendNothing) {
@@ -320,7 +310,10 @@ TEST_F(FiraRegionUtilsTest, ValueChecksRefuseWithTheirLineAndSendNothing) {
   EXPECT_EQ(Logged(ERROR, "SetMcpsCommand: MCPS netlink id is not resolved"), 1);
 }
 
-TEST_F(FiraRegionUtilsTest, CallsCarryTheirIdSessionAndParameters) {
+// Every request: its call, session id and what follows; refused when the
+// driver does not acknowledge it; and, wherever it runs out of room, refused
+// with the line of the builder that ran out, nothing sent.
+TEST_F(FiraRegionUtilsTest, RequestsCarryTheirCallAndFailWhereverTheyRunOutOfRoom) {
   const std::vector<uwb::UwbAddress> two = {{{0x0a, 0x0b}}, {{0x0c, 0x0d}}};
   const std::vector<int32_t> subs = {7, -1};
   const std::vector<uint8_t> add = {20,   0,    1, 0, 6, 0, 1,  0, 0x0b, 0x0a, 0,    0,   8, 0,
@@ -328,55 +321,43 @@ TEST_F(FiraRegionUtilsTest, CallsCarryTheirIdSessionAndParameters) {
                                     0x0d, 0x0c, 0, 0, 8, 0, 2,  0, 0xff, 0xff, 0xff, 0xff};
   const std::vector<uint8_t> remove = {12, 0, 1, 0, 6, 0, 1, 0, 0x0b, 0x0a, 0, 0,
                                        12, 0, 2, 0, 6, 0, 1, 0, 0x0d, 0x0c, 0, 0};
+  // Every optional crypto attribute too; its parameters are the table's above.
+  Session session = BaseSession();
+  session.id = 9;
+  session.stsConfig = uwb::FiraStsConfig(0);
+  session.isKeyRotationEnabled = true;
   const struct {
     uint8_t call;
     std::function<bool()> run;
-    std::vector<uint8_t> second;  // payload of the attribute after the session id
+    size_t count;                 // attributes in CALL_PARAMS
+    std::vector<uint8_t> second;  // payload of the one after the session id, if checked
   } cases[] = {
-      {FIRA_CALL_SESSION_INIT, [&] { return fira_.InitSession(kHw, 9); }, {}},
-      {FIRA_CALL_SESSION_STOP, [&] { return fira_.StopSession(kHw, 9); }, {}},
-      {FIRA_CALL_SESSION_DEINIT, [&] { return fira_.DeinitSession(kHw, 9); }, {}},
+      {FIRA_CALL_SESSION_INIT, [&] { return fira_.InitSession(kHw, 9); }, 1, {}},
+      {FIRA_CALL_SESSION_STOP, [&] { return fira_.StopSession(kHw, 9); }, 1, {}},
+      {FIRA_CALL_SESSION_DEINIT, [&] { return fira_.DeinitSession(kHw, 9); }, 1, {}},
+      {FIRA_CALL_SESSION_SET_PARAMS, [&] { return fira_.ConfigTwrSession(kHw, session); }, 2, {}},
       {FIRA_CALL_SESSION_SET_PARAMS,
        [&] { return fira_.UpdateBlockStriding(kHw, 9, 0x10203); },
+       2,
        {8, 0, FIRA_SESSION_PARAM_ATTR_BLOCK_STRIDING_VALUE, 0, 3, 2, 1, 0}},
-      {FIRA_CALL_NEW_CONTROLEE, [&] { return fira_.AddControlees(kHw, 9, two, &subs); }, add},
-      {FIRA_CALL_DEL_CONTROLEE, [&] { return fira_.RemoveControlees(kHw, 9, two); }, remove},
+      {FIRA_CALL_NEW_CONTROLEE, [&] { return fira_.AddControlees(kHw, 9, two, &subs); }, 2, add},
+      {FIRA_CALL_DEL_CONTROLEE, [&] { return fira_.RemoveControlees(kHw, 9, two); }, 2, remove},
   };
   for (const auto& c : cases) {
+    SCOPED_TRACE(static_cast<int>(c.call));
     ExpectSocket();
     ASSERT_TRUE(c.run());
     std::vector<nlattr*> params = CallParams(c.call);
-    ASSERT_EQ(params.size(), c.second.empty() ? 1u : 2u) << static_cast<int>(c.call);
+    ASSERT_EQ(params.size(), c.count);
     EXPECT_EQ(SentMessage::Payload(params[0]), SentMessage::Bytes<uint32_t>(9));
     if (!c.second.empty()) {
       EXPECT_EQ(SentMessage::Payload(params[1]), c.second);
     }
-  }
-  ExpectSocket(false);
-  EXPECT_FALSE(fira_.InitSession(kHw, 9));
-}
-
-// Wherever a request runs out of room, it fails with the line of the builder
-// that ran out, and nothing is sent.
-TEST_F(FiraRegionUtilsTest, EveryBuilderReportsRunningOutOfRoom) {
-  const std::vector<uwb::UwbAddress> two = {{{1, 2}}, {{3, 4}}};
-  const std::vector<int32_t> subs = {1, 2};
-  Session session = BaseSession();
-  session.stsConfig = uwb::FiraStsConfig(0);
-  session.isKeyRotationEnabled = true;
-  const std::function<bool()> ops[] = {
-      [&] { return fira_.InitSession(kHw, 1); },
-      [&] { return fira_.ConfigTwrSession(kHw, session); },
-      [&] { return fira_.AddControlees(kHw, 1, two, &subs); },
-      [&] { return fira_.RemoveControlees(kHw, 1, two); },
-      [&] { return fira_.UpdateBlockStriding(kHw, 1, 2); },
-  };
-  for (const auto& op : ops) {
-    ExpectSocket();
-    ASSERT_TRUE(op());
+    ExpectSocket(false);
+    EXPECT_FALSE(c.run());
     for (size_t size = NLMSG_HDRLEN; size < sent_.back().header()->nlmsg_len; size += 4) {
       nlmsg_set_default_size(size);
-      EXPECT_FALSE(op()) << size;
+      EXPECT_FALSE(c.run()) << size;
     }
     nlmsg_set_default_size(getpagesize());
   }
@@ -427,24 +408,24 @@ TEST_F(FiraRegionUtilsTest, SetPropertiesTakesTheLowByteOfValidNumbersOnly) {
   EXPECT_EQ(fira_.GetHwConfig(kHw + 1)->antenna_pair_elevation, 255u);
 }
 
-TEST_F(FiraRegionUtilsTest, StartSessionSharesOneWatchedRangingSocket) {
+TEST_F(FiraRegionUtilsTest, StartSessionNeedsACallbackAndKeepsOneWatchedSocket) {
   EXPECT_FALSE(fira_.StartSession(kHw, 1));
   fira_.SubscribeCallback(kHw, nullptr);
   EXPECT_FALSE(fira_.StartSession(kHw, 1));
   EXPECT_EQ(Logged(ERROR, "StartSession: Fira callback needs to be set for this hw_index."), 2);
   fira_.SubscribeCallback(kHw, &recorder_);
-  fira_.SubscribeCallback(kHw + 1, &recorder_);
   EXPECT_CALL(factory_, Create()).WillOnce(Return(ByMove(nullptr)));
   EXPECT_FALSE(fira_.StartSession(kHw, 1));
   EXPECT_EQ(Logged(ERROR, "StartSession: BAD_ALLOC: cannot allocate NlSocket"), 1);
 
-  // A socket that refuses the start, one that cannot be watched, one that works.
+  // A socket that refuses the start, one that cannot be watched, and one that
+  // works and then carries the next start as it is.
   std::weak_ptr<NlSocket> watched;
-  MockNlSocket* shared = nullptr;
   for (int attempt = 0; attempt < 3; ++attempt) {
     auto socket = std::make_unique<StrictMock<MockNlSocket>>();
-    shared = socket.get();
-    EXPECT_CALL(*socket, SendAndAwaitAck(_, _)).WillOnce(Return(attempt > 0));
+    EXPECT_CALL(*socket, SendAndAwaitAck(_, _))
+        .Times(attempt == 2 ? 2 : 1)
+        .WillRepeatedly(Return(attempt > 0));
     if (attempt > 0) {
       EXPECT_CALL(*socket, DisableAutoAck());
       EXPECT_CALL(*socket, WatchNetlinkSocket(_, _))
@@ -454,31 +435,10 @@ TEST_F(FiraRegionUtilsTest, StartSessionSharesOneWatchedRangingSocket) {
     EXPECT_EQ(fira_.StartSession(kHw, 1), attempt == 2);
     EXPECT_EQ(watched.expired(), attempt < 2);
   }
-  // The second start goes on the same socket; what arrives before its
-  // acknowledgement is a notification.
-  FiraNotificationData early;
-  early.hw_index = kHw + 1;
-  early.session_id = 2;
-  early.stopped = true;
-  UniqueNlMsg notification;
-  ASSERT_TRUE(sim::EncodeFiraNotification(notification.get(), kFamily, early));
-  EXPECT_CALL(*shared, SendAndAwaitAck(_, _))
-      .WillOnce([&](nl_msg*, std::function<int(nl_msg*)> on_message) {
-        EXPECT_EQ(on_message(notification.get()), NL_STOP);
-        return true;
-      });
-  ASSERT_TRUE(fira_.StartSession(kHw + 1, 2));
-  EXPECT_EQ(recorder_.stopped, std::vector<uint32_t>{2});
-
-  fira_.UnsubscribeCallback(kHw);
-  EXPECT_FALSE(watched.expired());
-  fira_.UnsubscribeCallback(kHw + 1);
-  EXPECT_TRUE(watched.expired());
-  fira_.UnsubscribeCallback(kHw + 7);
-  EXPECT_EQ(Logged(INFO, "CloseRangingSocket: Close ranging socket"), 1);
+  EXPECT_TRUE(fira_.StartSession(kHw, 2));
 }
 
-TEST_F(FiraRegionUtilsTest, NotificationsDecodeIntoResultsOrAreDroppedWithTheirLine) {
+TEST_F(FiraRegionUtilsTest, NotificationsDecodeIntoResults) {
   fira_.SubscribeCallback(kHw, &recorder_);
   config_.Set("antenna_pair_azimuth", "2");
   config_.Set("antenna_pair_elevation", "3");
@@ -491,19 +451,10 @@ TEST_F(FiraRegionUtilsTest, NotificationsDecodeIntoResultsOrAreDroppedWithTheirL
     change(m);
     return m;
   };
-  auto data = [&](std::vector<FiraMeasurementData> measurements) {
-    FiraNotificationData d;
-    d.hw_index = kHw;
-    d.session_id = 77;
-    d.index = 5;
-    d.timestamp_ns = 123456789;
-    d.measurements = std::move(measurements);
-    return d;
-  };
   const FiraAoaData aoa = {3, 100, 1, -200};
   const FiraAoaData unpaired = {4, 1, 2, 3};
   const FiraAoaData half = {2, 1, 2, std::nullopt};
-  auto batch = Decode(data({
+  auto batch = Decode(Result({
       peer(0x1234,
            [&](auto& m) {
              m.line_of_sight = true;
@@ -559,35 +510,14 @@ TEST_F(FiraRegionUtilsTest, NotificationsDecodeIntoResultsOrAreDroppedWithTheirL
   ASSERT_EQ(m[4].antennaMeasurements.size(), 1u);
   EXPECT_EQ(m[4].antennaMeasurements[0].kind, kFiraAntennaKindAzimuth);
 
-  // Ranging data that is not a result.
-  FiraNotificationData stop = data({peer(1, [](auto&) {})});
+  // A stop notice ends the session, whatever else the ranging data holds.
+  FiraNotificationData stop = Result({peer(1, [](auto&) {})});
   stop.stopped = true;
-  FiraNotificationData other_hw = data({}), other_call = data({}), no_session = data({}),
-                       no_index = data({}), no_list = data({});
-  other_hw.hw_index = kHw + 1;
-  other_call.call = FIRA_CALL_SESSION_START;
-  no_session.session_id.reset();
-  no_index.index.reset();
-  no_list.measurements.reset();
-  const std::pair<FiraNotificationData, std::string> dropped[] = {
-      {stop, ""},
-      {other_hw, "No callback for hw index: 4"},
-      {other_call, "Not a ranging notification message."},
-      {no_session, "Missing session ntf call attrs"},
-      {no_index, "Missing ranging data attr"},
-      {no_list, "Missing ranging data attr"},
-  };
-  for (const auto& [notification, text] : dropped) {
-    log_.Reset();
-    EXPECT_TRUE(Decode(notification).empty()) << text;
-    if (!text.empty()) {
-      EXPECT_EQ(log_.Entries().back().message, "OnRangingResult: " + text);
-    }
-  }
+  EXPECT_TRUE(Decode(stop).empty());
   EXPECT_EQ(recorder_.stopped, std::vector<uint32_t>{77});
 }
 
-TEST_F(FiraRegionUtilsTest, MessagesThatAreNotFiraCallsAreRefusedWithTheirLine) {
+TEST_F(FiraRegionUtilsTest, MessagesThatAreNotResultsAreDroppedWithTheirLine) {
   fira_.SubscribeCallback(kHw, &recorder_);
   // |fill| puts the attributes after the generic netlink header.
   auto raw = [](std::function<void(nl_msg*)> fill) {
@@ -606,11 +536,10 @@ TEST_F(FiraRegionUtilsTest, MessagesThatAreNotFiraCallsAreRefusedWithTheirLine) 
     });
   };
   auto encoded = [](std::function<void(FiraNotificationData&)> change) {
-    FiraNotificationData data;
-    data.hw_index = kHw;
+    FiraNotificationData data = Result({});
     change(data);
     auto msg = std::make_shared<UniqueNlMsg>();
-    sim::EncodeFiraNotification(msg->get(), kFamily, data);
+    EXPECT_TRUE(sim::EncodeFiraNotification(msg->get(), kFamily, data));
     return msg;
   };
   const struct {
@@ -619,37 +548,47 @@ TEST_F(FiraRegionUtilsTest, MessagesThatAreNotFiraCallsAreRefusedWithTheirLine) 
     std::string log;
   } cases[] = {
       {encoded([](auto& d) { d.cmd = MCPS802154_CMD_RANGING_REPORT; }), WARNING,
-       "Incorrect command received: 13"},
+       "GetCallContent: Incorrect command received: 13"},
+      // As long as a generic netlink header, but without one.
       {raw([](nl_msg* m) { nlmsg_hdr(m)->nlmsg_len = NLMSG_HDRLEN + 1; }), ERROR,
-       "Message doesn't respect policy"},
+       "GetCallContent: Message doesn't respect policy"},
       {raw([](nl_msg* m) { nla_put_u16(m, MCPS802154_ATTR_HW, 1); }), ERROR,
-       "Message doesn't respect policy"},
+       "GetCallContent: Message doesn't respect policy"},
       {encoded([](auto& d) { d.hw_index.reset(); }), ERROR,
-       "Missing MCPS802154_ATTR_HW or MCPS802154_ATTR_SCHEDULER_REGION_CALL"},
+       "GetCallContent: Missing MCPS802154_ATTR_HW or MCPS802154_ATTR_SCHEDULER_REGION_CALL"},
       {call([](nl_msg* m) { nla_put_u8(m, MCPS802154_REGION_CALL_ATTR_CALL, 8); }), ERROR,
-       "Incorrect MCPS802154_ATTR_SCHEDULER_REGION_CALL nested message"},
+       "GetCallContent: Incorrect MCPS802154_ATTR_SCHEDULER_REGION_CALL nested message"},
       {encoded([](auto& d) { d.region = "ccc"; }), ERROR,
-       "Missing Fira region name in mcps message"},
+       "GetCallContent: Missing Fira region name in mcps message"},
       {encoded([](auto& d) { d.region.reset(); }), ERROR,
-       "Missing Fira region name in mcps message"},
-      {encoded([](auto& d) { d.call.reset(); }), ERROR, "Missing Fira call in mcps message"},
+       "GetCallContent: Missing Fira region name in mcps message"},
+      {encoded([](auto& d) { d.call.reset(); }), ERROR,
+       "GetCallContent: Missing Fira call in mcps message"},
       {encoded([](auto& d) { d.has_call_params = false; }), ERROR,
-       "Missing Fira call params in mcps message"},
+       "GetCallContent: Missing Fira call params in mcps message"},
+      {encoded([](auto& d) { d.call = FIRA_CALL_SESSION_START; }), INFO,
+       "OnRangingResult: Not a ranging notification message."},
+      {encoded([](auto& d) { d.hw_index = kHw + 1; }), INFO,
+       "OnRangingResult: No callback for hw index: 4"},
+      {encoded([](auto& d) { d.session_id.reset(); }), WARNING,
+       "OnRangingResult: Missing session ntf call attrs"},
+      {call([](nl_msg* m) { PutBadlySizedNotification(m, true); }), WARNING,
+       "OnRangingResult: Failed to parse session ntf call attr"},
+      {encoded([](auto& d) { d.index.reset(); }), WARNING,
+       "OnRangingResult: Missing ranging data attr"},
+      {encoded([](auto& d) { d.measurements.reset(); }), WARNING,
+       "OnRangingResult: Missing ranging data attr"},
   };
   for (const auto& c : cases) {
     log_.Reset();
-    uint32_t hw = 0;
-    uint8_t id = 0;
-    EXPECT_EQ(fira_.GetCallContent(c.msg->get(), &hw, &id), nullptr);
-    EXPECT_EQ(Logged(c.severity, "GetCallContent: " + c.log), 1) << log_.Text();
+    EXPECT_EQ(fira_.OnRangingResult(c.msg->get()), NL_STOP);
+    EXPECT_EQ(Logged(c.severity, c.log), 1) << log_.Text();
   }
-  // Attributes of the wrong width further down: the ranging data's index,
-  // one measurement's address, and the other's angle data.
-  for (bool bad_index : {true, false}) {
-    auto msg = call([&](nl_msg* m) { PutBadlySizedNotification(m, bad_index); });
-    fira_.OnRangingResult(msg->get());
-  }
-  EXPECT_EQ(Logged(WARNING, "OnRangingResult: Failed to parse session ntf call attr"), 1);
+  EXPECT_TRUE(recorder_.results.empty());
+  EXPECT_TRUE(recorder_.stopped.empty());
+  // A measurement's address and another's angle of the wrong width drop
+  // only themselves.
+  fira_.OnRangingResult(call([](nl_msg* m) { PutBadlySizedNotification(m, false); })->get());
   EXPECT_EQ(Logged(ERROR, "ParseMeasurements: Failed to parse ranging measurement"), 1);
   EXPECT_EQ(Logged(ERROR, "ParseAntennaMeasurement: Failed to parse aoa data measurement"), 1);
   ASSERT_EQ(recorder_.results.size(), 1u);

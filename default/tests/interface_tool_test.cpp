@@ -81,7 +81,7 @@ class InterfaceToolTest : public ::testing::Test {
   WatchedInterfaceTool tool_;
 };
 
-TEST_F(InterfaceToolTest, NameTooLongForIfreqIsRefusedBeforeAnyIoctl) {
+TEST_F(InterfaceToolTest, LongNamesAreRefusedBeforeAnyIoctlAndInterruptedIoctlsRetried) {
   EXPECT_FALSE(tool_.GetUpState(kTooLongName));
   EXPECT_FALSE(tool_.SetUpState(kTooLongName, true));
   EXPECT_FALSE(tool_.SetMacAddress(kTooLongName, MacAddress{2, 1, 2, 3, 4, 5, 6, 7}));
@@ -90,18 +90,17 @@ TEST_F(InterfaceToolTest, NameTooLongForIfreqIsRefusedBeforeAnyIoctl) {
   EXPECT_EQ(4, log_.Count(android::base::ERROR,
                           std::string("Interface name is too long: ") + kTooLongName, kTag))
       << log_.Text();
-}
 
-TEST_F(InterfaceToolTest, InterruptedIoctlIsRetriedAndTheRealFailureKeepsErrno) {
+  tool_.requests.clear();
   tool_.interruptions[SIOCGIFFLAGS] = 3;
   errno = 0;
   EXPECT_FALSE(tool_.SetUpState("nosuchuwb0", true));
   EXPECT_EQ(ENODEV, errno);
   // Retried until the kernel answered; nothing is set on an unknown interface.
   EXPECT_EQ((std::vector<unsigned long>(4, SIOCGIFFLAGS)), tool_.requests);
-  EXPECT_EQ(1, log_.Count(android::base::ERROR,
-                          SystemError("Could not read interface state", "nosuchuwb0", ENODEV),
-                          kTag))
+  EXPECT_EQ(1,
+            log_.Count(android::base::ERROR,
+                       SystemError("Could not read interface state", "nosuchuwb0", ENODEV), kTag))
       << log_.Text();
 }
 
@@ -176,10 +175,10 @@ TEST_F(InterfaceToolKernelTest, AddressIsWrittenWithTheIeee802154FamilyOrRefused
   errno = 0;
   EXPECT_FALSE(tool_.SetMacAddress(kTapName, MacAddress{0x01, 1, 2, 3, 4, 5, 6, 7}));
   EXPECT_EQ(EADDRNOTAVAIL, errno);
-  EXPECT_EQ(1, log_.Count(android::base::ERROR,
-                          SystemError("Could not set interface MAC address", kTapName,
-                                      EADDRNOTAVAIL),
-                          kTag))
+  EXPECT_EQ(
+      1,
+      log_.Count(android::base::ERROR,
+                 SystemError("Could not set interface MAC address", kTapName, EADDRNOTAVAIL), kTag))
       << log_.Text();
 }
 
@@ -205,9 +204,9 @@ TEST_F(InterfaceToolKernelTest, FactoryAddressNeedsExactlyEightBytesBack) {
   errno = 0;
   EXPECT_EQ(MacAddress{}, tool_.GetFactoryMacAddress(kTapName));
   EXPECT_EQ(EOPNOTSUPP, errno);
-  EXPECT_EQ(1, log_.Count(android::base::ERROR,
-                          SystemError("Could not get factory address MAC", kTapName, EOPNOTSUPP),
-                          kTag))
+  EXPECT_EQ(
+      1, log_.Count(android::base::ERROR,
+                    SystemError("Could not get factory address MAC", kTapName, EOPNOTSUPP), kTag))
       << log_.Text();
 }
 

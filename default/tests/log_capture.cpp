@@ -1,5 +1,6 @@
 #include "tests/log_capture.h"
 
+#include <algorithm>
 #include <sstream>
 
 namespace hardware {
@@ -27,14 +28,10 @@ std::vector<LogCapture::Entry> LogCapture::Entries() const {
 int LogCapture::Count(android::base::LogSeverity severity, const std::string& message,
                       const char* tag) const {
   std::lock_guard<std::mutex> lock(mutex_);
-  int count = 0;
-  for (const Entry& entry : entries_) {
-    if (entry.severity == severity && entry.message == message &&
-        (tag == nullptr || entry.tag == tag)) {
-      ++count;
-    }
-  }
-  return count;
+  return std::count_if(entries_.begin(), entries_.end(), [&](const Entry& entry) {
+    return entry.severity == severity && entry.message == message &&
+           (tag == nullptr || entry.tag == tag);
+  });
 }
 
 std::string LogCapture::Text() const {

@@ -3,6 +3,7 @@
 #include <fcntl.h>
 #include <unistd.h>
 
+#include <functional>
 #include <string>
 #include <thread>
 #include <vector>
@@ -17,6 +18,7 @@ namespace dalix {
 namespace {
 
 using android::base::unique_fd;
+using Calls = std::vector<std::string>;
 
 class LooperBackedEventLoopTest : public ::testing::Test {
  protected:
@@ -44,53 +46,45 @@ class LooperBackedEventLoopTest : public ::testing::Test {
     ASSERT_EQ(static_cast<ssize_t>(count), write(write_end_.get(), bytes.data(), count));
   }
 
-  static void ReadOneByte(int fd) {
-    char byte;
-    ASSERT_EQ(1, read(fd, &byte, 1));
+  // Watches the read end; each wake-up takes one byte and records |name|,
+  // and the third one quits the loop.
+  bool WatchReads(
+      const std::string& name, const std::function<void()>& also = [] {}) {
+    return loop_.WatchFileDescriptor(read_end_.get(), EventLoop::kModeInput,
+                                     [this, name, also](int fd) {
+                                       EXPECT_EQ(read_end_.get(), fd);
+                                       char byte;
+                                       ASSERT_EQ(1, read(fd, &byte, 1));
+                                       also();
+                                       calls_.push_back(name);
+                                       if (calls_.size() == 3) loop_.Quit();
+                                     });
   }
 
   LooperBackedEventLoop loop_;
   unique_fd read_end_;
   unique_fd write_end_;
+  Calls calls_;
 };
 
-TEST_F(LooperBackedEventLoopTest, WatchStopAndWatchAgain) {
-  std::vector<std::string> calls;
-  ASSERT_TRUE(loop_.WatchFileDescriptor(read_end_.get(), EventLoop::kModeInput, [&](int fd) {
-    EXPECT_EQ(read_end_.get(), fd);
-    ReadOneByte(fd);
-    calls.push_back("first");
-  }));
-  WriteBytes(1);
-  PollOnce(1000);
-  EXPECT_EQ(std::vector<std::string>{"first"}, calls);
-
-  EXPECT_TRUE(loop_.StopWatchFileDescriptor(read_end_.get()));
-  EXPECT_FALSE(loop_.StopWatchFileDescriptor(read_end_.get()));
-  WriteBytes(1);
-  PollOnce(0);
-  EXPECT_EQ(1u, calls.size());
-
-  ASSERT_TRUE(loop_.WatchFileDescriptor(read_end_.get(), EventLoop::kModeInput, [&](int fd) {
-    ReadOneByte(fd);
-    calls.push_back("second");
-  }));
-  PollOnce(1000);
-  EXPECT_EQ((std::vector<std::string>{"first", "second"}), calls);
-}
-
-TEST_F(LooperBackedEventLoopTest, CallbackStaysRegisteredAcrossCalls) {
-  int calls = 0;
-  ASSERT_TRUE(loop_.WatchFileDescriptor(read_end_.get(), EventLoop::kModeInput, [&](int fd) {
-    ReadOneByte(fd);
-    if (++calls == 3) loop_.Quit();
-  }));
+TEST_F(LooperBackedEventLoopTest, WatchStaysUntilStoppedAndCanBeWatchedAgain) {
+  ASSERT_TRUE(WatchReads("first"));
   WriteBytes(3);
   loop_.Poll();
-  EXPECT_EQ(3, calls);
-}
+  EXPECT_EQ(Calls(3, "first"), calls_);
 
-TEST_F(LooperBackedEventLoopTest, OutputModeReportsWritableDescriptor) {
+  // Only a watched descriptor can be stopped, and only once.
+  EXPECT_TRUE(loop_.StopWatchFileDescriptor(read_end_.get()));
+  EXPECT_FALSE(loop_.StopWatchFileDescriptor(read_end_.get()));
+  EXPECT_FALSE(loop_.StopWatchFileDescriptor(write_end_.get()));
+  WriteBytes(1);
+  PollOnce(0);
+  EXPECT_EQ(3u, calls_.size());
+
+  ASSERT_TRUE(WatchReads("second"));
+  PollOnce(1000);
+  EXPECT_EQ("second", calls_.back());
+
   int ready_fd = -1;
   ASSERT_TRUE(loop_.WatchFileDescriptor(write_end_.get(), EventLoop::kModeOutput,
                                         [&](int fd) { ready_fd = fd; }));
@@ -114,21 +108,14 @@ TEST_F(LooperBackedEventLoopTest, InvalidModeIsRefusedAndLogged) {
   EXPECT_FALSE(loop_.StopWatchFileDescriptor(read_end_.get()));
 }
 
-TEST_F(LooperBackedEventLoopTest, TaskPostedFromCallbackRunsOnTheNextPoll) {
-  std::vector<std::string> order;
-  ASSERT_TRUE(loop_.WatchFileDescriptor(read_end_.get(), EventLoop::kModeInput, [&](int fd) {
-    ReadOneByte(fd);
-    loop_.PostTask([&] { order.push_back("task"); });
-    order.push_back("callback done");
-  }));
+TEST_F(LooperBackedEventLoopTest, TasksRunOnTheLoopThreadAfterTheCallbackThatPostedThem) {
+  ASSERT_TRUE(WatchReads("callback", [&] { loop_.PostTask([&] { calls_.push_back("task"); }); }));
   WriteBytes(1);
   PollOnce(1000);
-  EXPECT_EQ(std::vector<std::string>{"callback done"}, order);
+  EXPECT_EQ(Calls{"callback"}, calls_);
   PollOnce(1000);
-  EXPECT_EQ((std::vector<std::string>{"callback done", "task"}), order);
-}
+  EXPECT_EQ((Calls{"callback", "task"}), calls_);
 
-TEST_F(LooperBackedEventLoopTest, TaskPostedFromAnotherThreadRunsOnTheLoopThread) {
   std::thread::id ran_on;
   std::thread poster([&] {
     loop_.PostTask([&] {

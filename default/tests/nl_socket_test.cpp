@@ -2,10 +2,13 @@
 
 #include "net/nl_socket.h"
 
+#include <fcntl.h>
+#include <sys/resource.h>
+#include <unistd.h>
+
 #include <cstdint>
 #include <memory>
 #include <string>
-#include <tuple>
 #include <utility>
 #include <vector>
 
@@ -15,6 +18,9 @@
 #include <netlink/genl/genl.h>
 #include <netlink/socket.h>
 
+#include "net/ieee_utils.h"
+#include "net/mcps_utils.h"
+#include "net/nl_socket_factory.h"
 #include "net/unique_nl_msg.h"
 #include "sim/driver_simulator.h"
 #include "sim/fault.h"
@@ -29,7 +35,7 @@ namespace hardware {
 namespace dalix {
 namespace {
 
-using android::base::INFO;
+using android::base::ERROR;
 using android::base::WARNING;
 using sim::Fault;
 using ::testing::_;
@@ -54,16 +60,6 @@ class TestSocket : public sim::SimNlSocket {
 // A test-family message as a handler saw it: command, value (0 when none).
 using Seen = std::pair<int, uint32_t>;
 
-Seen Inspect(nl_msg* msg) {
-  nlattr* attrs[sim::kTestAttrMax + 1];
-  uint32_t value = 0;
-  if (genlmsg_parse(nlmsg_hdr(msg), 0, attrs, sim::kTestAttrMax, sim::kTestPolicy) == 0 &&
-      attrs[sim::kTestAttrValue]) {
-    value = nla_get_u32(attrs[sim::kTestAttrValue]);
-  }
-  return {genlmsg_hdr(nlmsg_hdr(msg))->cmd, value};
-}
-
 class NlSocketTest : public ::testing::Test {
  protected:
   void SetUp() override {
@@ -78,15 +74,6 @@ class NlSocketTest : public ::testing::Test {
     UniqueNlMsg msg = sim::TestFamily::NewRequest(family_id_, cmd);
     if (attr != 0) nla_put_u32(msg.get(), attr, value);
     return msg;
-  }
-
-  // Lets the loop watch |socket_| (mode 1, exactly) and keeps its callback;
-  // the socket's destructor stops the watch.
-  void ExpectWatch() {
-    EXPECT_CALL(event_loop_,
-                WatchFileDescriptor(socket_->fd(), static_cast<EventLoop::ReadyMode>(1), _))
-        .WillOnce(DoAll(SaveArg<2>(&wake_), Return(true)));
-    EXPECT_CALL(event_loop_, StopWatchFileDescriptor(socket_->fd())).WillOnce(Return(true));
   }
 
   std::vector<std::string> Lines(android::base::LogSeverity severity) const {
@@ -107,122 +94,102 @@ class NlSocketTest : public ::testing::Test {
   std::function<void(int)> wake_;
   std::vector<Seen> handed_;
   std::function<int(nl_msg*)> record_ = [this](nl_msg* msg) {
-    handed_.push_back(Inspect(msg));
+    nlattr* value = nlmsg_find_attr(nlmsg_hdr(msg), GENL_HDRLEN, sim::kTestAttrValue);
+    handed_.emplace_back(genlmsg_hdr(nlmsg_hdr(msg))->cmd, value ? nla_get_u32(value) : 0);
     return NL_OK;
   };
 };
 
 // One answer of the simulator to a get of the stored value 42, and what each
-// exchange makes of it. Log lines lack their "<exchange>: " prefix.
+// exchange makes of it. Warnings lack their "<exchange>: " prefix; a read
+// more than the answer needs would time out and warn.
 struct Answer {
   const char* name;
   Fault fault;
   bool stop_simulator;
   bool result;
   std::vector<Seen> ack_handed, response_handed;
-  std::vector<std::string> warnings, ack_info, response_info;
-  bool ack_only = false;  // the response exchange would wait for data until it times out
+  std::vector<std::string> warnings;
 };
-
-void PrintTo(const Answer& answer, std::ostream* os) { *os << answer.name; }
 
 const Seen kValue{sim::kTestCmdValue, 42};
 const std::string kReadError = "Error reading message: ";
 
 // clang-format off
 const Answer kAnswers[] = {
-    {"Clean", {}, false, true, {kValue}, {kValue}, {}, {"Received ACK"}, {"Read message"}},
-    {"AckWithoutData", {Fault::Kind::kAckOnly}, false, true, {}, {}, {}, {"Received ACK"}, {},
-     true},
-    // False after one read: the error ends the read that carried it.
+    {"Clean", {}, false, true, {kValue}, {kValue}, {}},
+    // The error ends the read that carried it.
     {"Error", {Fault::Kind::kError, EBUSY}, false, false, {}, {},
-     {"Nl error: " + std::to_string(-EBUSY), kReadError + nl_geterror(-nl_syserr2nlerr(EBUSY))}, {}, {"Read message"}},
+     {"Nl error: " + std::to_string(-EBUSY), kReadError + nl_geterror(-nl_syserr2nlerr(EBUSY))}},
     // The acknowledge exchange hands every data message on; the response
-    // exchange logs and skips the other command.
+    // exchange skips the other command.
     {"OtherCommandFirst", {Fault::Kind::kOtherCommandFirst, 0, sim::kTestCmdList}, false, true,
-     {{sim::kTestCmdList, 0}, kValue}, {kValue}, {}, {"Received ACK"},
-     {"Read message", "Incorrect received command, got 4 instead of 3", "Read message"}},
+     {{sim::kTestCmdList, 0}, kValue}, {kValue}, {}},
     {"NoAnswer", {Fault::Kind::kNoAnswer}, false, false, {}, {},
-     {kReadError + nl_geterror(-NLE_AGAIN)}, {}, {"Read message"}},
+     {kReadError + nl_geterror(-NLE_AGAIN)}},
     {"FailedSend", {}, true, false, {}, {},
-     {std::string("Error sending netlink message: ") + nl_geterror(-nl_syserr2nlerr(ECONNREFUSED))},
-     {}, {}},
+     {std::string("Error sending netlink message: ") + nl_geterror(-nl_syserr2nlerr(ECONNREFUSED))}},
 };
 // clang-format on
 
-std::vector<std::tuple<bool, Answer>> Exchanges() {
-  std::vector<std::tuple<bool, Answer>> exchanges;
+// Each answer to either exchange, on a socket of its own. After a success,
+// whatever is left of the answer (a trailing acknowledgement after a reply),
+// a value set on that socket is then read back.
+TEST_F(NlSocketTest, ExchangesHandleEveryAnswerAndLeaveTheSocketUsable) {
   for (const Answer& answer : kAnswers) {
-    exchanges.emplace_back(true, answer);
-    if (!answer.ack_only) exchanges.emplace_back(false, answer);
+    for (const bool ack : {true, false}) {
+      const std::string op = ack ? "SendAndAwaitAck" : "SendAndAwaitResponse";
+      SCOPED_TRACE(op + " " + answer.name);
+      socket_ = std::make_shared<TestSocket>(&event_loop_);
+      ASSERT_TRUE(socket_->Setup());
+      UniqueNlMsg set = Request(sim::kTestCmdSet, sim::kTestAttrValue, 42);
+      ASSERT_TRUE(factory_.SendAndAwaitAck(set.get(), LOG_TAG));
+      simulator_.SetFault(sim::kTestFamilyName, answer.fault);
+      if (answer.stop_simulator) simulator_.Stop();
+      log_.Reset();
+      handed_.clear();
+
+      UniqueNlMsg get = Request(sim::kTestCmdGet);
+      bool result = ack ? socket_->SendAndAwaitAck(get.get(), record_)
+                        : socket_->SendAndAwaitResponse(get.get(), record_, sim::kTestCmdValue);
+      std::vector<std::string> warnings;
+      for (const std::string& line : answer.warnings) warnings.push_back(op + ": " + line);
+      EXPECT_EQ(answer.result, result);
+      EXPECT_EQ(ack ? answer.ack_handed : answer.response_handed, handed_);
+      EXPECT_EQ(warnings, Lines(WARNING)) << log_.Text();
+
+      simulator_.SetFault(sim::kTestFamilyName, {});
+      if (answer.stop_simulator) {
+        ASSERT_TRUE(simulator_.Start());
+      }
+      if (!answer.result) continue;
+      handed_.clear();
+      UniqueNlMsg set_again = Request(sim::kTestCmdSet, sim::kTestAttrValue, 7);
+      EXPECT_TRUE(socket_->SendAndAwaitAck(set_again.get(), nullptr));
+      UniqueNlMsg get_again = Request(sim::kTestCmdGet);
+      EXPECT_TRUE(socket_->SendAndAwaitResponse(get_again.get(), record_, sim::kTestCmdValue));
+      EXPECT_EQ(handed_, std::vector<Seen>{Seen(sim::kTestCmdValue, 7)});
+    }
   }
-  return exchanges;
 }
 
-class NlSocketExchangeTest : public NlSocketTest,
-                             public ::testing::WithParamInterface<std::tuple<bool, Answer>> {};
-
-TEST_P(NlSocketExchangeTest, HandlesTheAnswer) {
-  const bool ack = std::get<0>(GetParam());
-  const Answer& answer = std::get<1>(GetParam());
-  UniqueNlMsg set = Request(sim::kTestCmdSet, sim::kTestAttrValue, 42);
-  ASSERT_TRUE(factory_.SendAndAwaitAck(set.get(), LOG_TAG));
-  simulator_.SetFault(sim::kTestFamilyName, answer.fault);
-  if (answer.stop_simulator) simulator_.Stop();
-  log_.Reset();
-
-  UniqueNlMsg get = Request(sim::kTestCmdGet);
-  bool result = ack ? socket_->SendAndAwaitAck(get.get(), record_)
-                    : socket_->SendAndAwaitResponse(get.get(), record_, sim::kTestCmdValue);
-
-  const std::string op = ack ? "SendAndAwaitAck" : "SendAndAwaitResponse";
-  auto prefixed = [&op](const std::vector<std::string>& lines) {
-    std::vector<std::string> out;
-    for (const std::string& line : lines) out.push_back(op + ": " + line);
-    return out;
-  };
-  std::vector<std::string> info = prefixed(ack ? answer.ack_info : answer.response_info);
-  if (!ack) info.insert(info.begin(), op);
-  EXPECT_EQ(answer.result, result);
-  EXPECT_EQ(ack ? answer.ack_handed : answer.response_handed, handed_);
-  EXPECT_EQ(prefixed(answer.warnings), Lines(WARNING)) << log_.Text();
-  EXPECT_EQ(info, Lines(INFO)) << log_.Text();
-}
-
-INSTANTIATE_TEST_SUITE_P(Answers, NlSocketExchangeTest, ::testing::ValuesIn(Exchanges()),
-                         [](const ::testing::TestParamInfo<std::tuple<bool, Answer>>& info) {
-                           return std::string(std::get<0>(info.param) ? "Ack" : "Response") +
-                                  std::get<1>(info.param).name;
-                         });
-
-// A reply's trailing acknowledgement must not upset the next exchange.
-TEST_F(NlSocketTest, ExchangesFollowOneAnotherOnOneSocket) {
-  for (uint32_t value : {1u, 2u, 3u}) {
-    UniqueNlMsg set = Request(sim::kTestCmdSet, sim::kTestAttrValue, value);
-    ASSERT_TRUE(socket_->SendAndAwaitAck(set.get(), nullptr));
-    UniqueNlMsg get = Request(sim::kTestCmdGet);
-    ASSERT_TRUE(socket_->SendAndAwaitResponse(get.get(), record_, sim::kTestCmdValue));
-  }
-  EXPECT_THAT(handed_, ElementsAre(Seen{sim::kTestCmdValue, 1}, Seen{sim::kTestCmdValue, 2},
-                                   Seen{sim::kTestCmdValue, 3}));
-}
-
-TEST_F(NlSocketTest, ResolveRegisteredUnknownAndVanishedFamilies) {
-  EXPECT_EQ(family_id_, socket_->Resolve(sim::kTestFamilyName));
-  EXPECT_EQ(-NLE_OBJ_NOTFOUND, socket_->Resolve("no_such_family"));
-  simulator_.SetFamilyPresent(sim::kTestFamilyName, false);
-  EXPECT_EQ(-NLE_OBJ_NOTFOUND, socket_->Resolve(sim::kTestFamilyName));
-}
-
-TEST_F(NlSocketTest, WatchDeliversEventsToTheFirstHandlerUntilReleased) {
+// Without a live owner the strict loop sees no call; a watch that was
+// stopped can start again, but one socket takes one handler at a time.
+TEST_F(NlSocketTest, WatchDeliversEventsToOneHandlerWhileTheOwnerLives) {
+  EXPECT_FALSE(socket_->WatchNetlinkSocket(std::weak_ptr<NlSocket>(), record_));
   socket_->DisableAutoAck();
-  int fd = socket_->fd();
-  ExpectWatch();
+  const int fd = socket_->fd();
+  ::testing::InSequence in_order;
+  for (int i = 0; i < 2; ++i) {
+    // Mode 1 exactly; the second stop is the socket destructor's.
+    EXPECT_CALL(event_loop_, WatchFileDescriptor(fd, static_cast<EventLoop::ReadyMode>(1), _))
+        .WillOnce(DoAll(SaveArg<2>(&wake_), Return(true)));
+    EXPECT_CALL(event_loop_, StopWatchFileDescriptor(fd)).WillOnce(Return(true));
+  }
   ASSERT_TRUE(socket_->WatchNetlinkSocket(socket_, record_));
-  EXPECT_FALSE(socket_->WatchNetlinkSocket(socket_, [](nl_msg*) {
-    ADD_FAILURE() << "the refused handler was called";
-    return NL_OK;
-  }));
+  EXPECT_TRUE(socket_->StopWatchNetlinkSocket());
+  ASSERT_TRUE(socket_->WatchNetlinkSocket(socket_, record_));
+  EXPECT_FALSE(socket_->WatchNetlinkSocket(socket_, record_));
   UniqueNlMsg subscribe = Request(sim::kTestCmdSubscribe, sim::kTestAttrCount, 3);
   ASSERT_TRUE(socket_->SendAndAwaitAck(subscribe.get(), nullptr));
   wake_(fd);
@@ -235,28 +202,6 @@ TEST_F(NlSocketTest, WatchDeliversEventsToTheFirstHandlerUntilReleased) {
   wake_(fd);
   EXPECT_EQ(2u, handed_.size());
   EXPECT_EQ(1, log_.Count(WARNING, "WatchNetlinkSocket: socket is close", kTag));
-}
-
-// The strict loop sees no call.
-TEST_F(NlSocketTest, WatchNeedsALiveOwner) {
-  EXPECT_FALSE(socket_->WatchNetlinkSocket(std::weak_ptr<NlSocket>(), record_));
-  auto other = std::make_shared<TestSocket>(&event_loop_);
-  ASSERT_TRUE(other->Setup());
-  std::weak_ptr<NlSocket> expired = other;
-  other.reset();
-  EXPECT_FALSE(socket_->WatchNetlinkSocket(expired, record_));
-}
-
-TEST_F(NlSocketTest, StopThenWatchAgain) {
-  ::testing::InSequence in_order;
-  for (int i = 0; i < 2; ++i) {
-    EXPECT_CALL(event_loop_, WatchFileDescriptor(socket_->fd(), _, _)).WillOnce(Return(true));
-    EXPECT_CALL(event_loop_, StopWatchFileDescriptor(socket_->fd())).WillOnce(Return(true));
-  }
-  ASSERT_TRUE(socket_->WatchNetlinkSocket(socket_, record_));
-  EXPECT_TRUE(socket_->StopWatchNetlinkSocket());
-  EXPECT_EQ(1, log_.Count(INFO, "StopWatchNetlinkSocket", kTag));
-  EXPECT_TRUE(socket_->WatchNetlinkSocket(socket_, record_));
 }
 
 TEST_F(NlSocketTest, ErrorWithoutErrorHandlerStopsTheRead) {
@@ -290,6 +235,62 @@ TEST_F(NlSocketTest, ErrorWithoutErrorHandlerStopsTheRead) {
   EXPECT_TRUE(handed_.empty());
   EXPECT_THAT(Lines(WARNING),
               ElementsAre("SendAndAwaitResponse: Nl error: " + std::to_string(-EIO), read_error));
+}
+
+// While alive, the process cannot open another descriptor, so every socket
+// connect fails as it does on a process out of descriptors.
+class DescriptorsExhausted {
+ public:
+  DescriptorsExhausted() {
+    getrlimit(RLIMIT_NOFILE, &saved_);
+    int lowest_free = open("/dev/null", O_RDONLY | O_CLOEXEC);
+    close(lowest_free);
+    rlimit limit = saved_;
+    limit.rlim_cur = lowest_free;
+    setrlimit(RLIMIT_NOFILE, &limit);
+  }
+  ~DescriptorsExhausted() { setrlimit(RLIMIT_NOFILE, &saved_); }
+
+ private:
+  rlimit saved_;
+};
+
+// The production factory and the simulator's behave alike when no socket can
+// be made; each one-shot names the client that asked, not this file.
+TEST(NlSocketFactoryTest, OneShotsWithoutDescriptorsFailUnderTheCallersTag) {
+  NlSocketFactory kernel(nullptr);
+  sim::SimNlSocketFactory simulated(nullptr, sim::DriverSimulator::kDefaultPort);
+  for (NlSocketFactory* factory : {&kernel, static_cast<NlSocketFactory*>(&simulated)}) {
+    SCOPED_TRACE(factory == &kernel ? "kernel" : "simulator");
+    // With descriptors to spare the same factory succeeds, so what fails
+    // below is the exhaustion alone. This first socket and log line also let
+    // a sanitizer runtime set up what it opens descriptors for.
+    ASSERT_NE(nullptr, factory->Create());
+    LOG(INFO) << "descriptors available";
+    LogCapture log;
+    McpsUtils mcps(factory);
+    IeeeUtils ieee(factory);
+    std::unique_ptr<NlSocket> socket;
+    bool acked = true, listed = true;
+    {
+      DescriptorsExhausted exhausted;
+      socket = factory->Create();
+      // Two clients built into one program: each line names its own client,
+      // whatever order the objects were linked in.
+      acked = mcps.SetFiraRegion(0);
+      ieee.ListDevices(&listed);
+    }
+    EXPECT_EQ(nullptr, socket);
+    EXPECT_FALSE(acked || listed);
+    EXPECT_EQ(3,
+              log.Count(ERROR, "Setup: Failed to connect to generic netlink", "dalix.uwb.NlSocket"))
+        << log.Text();
+    EXPECT_EQ(1, log.Count(ERROR, "SendAndAwaitAck: BAD_ALLOC: cannot allocate NlSocket",
+                           "dalix.uwb.McpsUtils"))
+        << log.Text();
+    EXPECT_EQ(1, log.Count(ERROR, "SendAndAwaitResponse: BAD_ALLOC: cannot allocate NlSocket",
+                           "dalix.uwb.IeeeUtils"));
+  }
 }
 
 }  // namespace

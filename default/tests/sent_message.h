@@ -25,18 +25,14 @@ class SentMessage {
   }
 
   nlmsghdr* header() { return reinterpret_cast<nlmsghdr*>(bytes_.data()); }
-  genlmsghdr* genl() { return genlmsg_hdr(header()); }
-  uint8_t cmd() { return genl()->cmd; }
-  uint16_t flags() { return header()->nlmsg_flags; }
+  uint8_t cmd() { return genlmsg_hdr(header())->cmd; }
 
   // Top-level attributes in the order they were put.
   std::vector<nlattr*> Attrs() {
     std::vector<nlattr*> attrs;
     nlattr* attr;
     int remaining;
-    nla_for_each_attr(attr, genlmsg_attrdata(genl(), 0), genlmsg_attrlen(genl(), 0), remaining) {
-      attrs.push_back(attr);
-    }
+    nlmsg_for_each_attr(attr, header(), GENL_HDRLEN, remaining) attrs.push_back(attr);
     return attrs;
   }
 

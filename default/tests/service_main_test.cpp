@@ -1,22 +1,21 @@
-// The daemon's start-up, run whole in a child process as on a device: the
-// real socket factory and interface tool, and no UWB driver anywhere.
+// The daemon's start-up and exit, run whole on a thread of its own with the
+// device's platform: the real socket factory and interface tool, and no UWB
+// driver anywhere.
 #include "service_main.h"
 
-#include <sys/wait.h>
-#include <unistd.h>
-
+#include <future>
+#include <memory>
 #include <string>
 #include <thread>
 #include <vector>
 
 #include <aidl/aidl/hardware/dalix/uwb/IUwb.h>
-#include <android-base/file.h>
-#include <android-base/logging.h>
-#include <android-base/strings.h>
-#include <android-base/unique_fd.h>
 #include <android/binder_manager.h>
+#include <binder_host/host.h>
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
+
+#include "tests/log_capture.h"
 
 namespace hardware {
 namespace dalix {
@@ -25,85 +24,53 @@ namespace {
 namespace uwb = aidl::aidl::hardware::dalix::uwb;
 using ::testing::ElementsAre;
 
-// The device's platform, plus a probe that, once the service serves, looks
-// it up as a client would, calls it, and ends the loop.
-class ProbedDevicePlatform : public ServicePlatform {
+class DevicePlatform : public ServicePlatform {
  public:
-  explicit ProbedDevicePlatform(int report_fd) : report_fd_(report_fd) {}
-  ~ProbedDevicePlatform() override {
-    if (probe_.joinable()) probe_.join();
-  }
-
   std::unique_ptr<NlSocketFactory> NewSocketFactory(EventLoop* event_loop) override {
     return std::make_unique<NlSocketFactory>(event_loop);
   }
   std::unique_ptr<InterfaceTool> NewInterfaceTool() override {
     return std::make_unique<InterfaceTool>();
   }
-  void OnServing(LooperBackedEventLoop* event_loop) override {
-    probe_ = std::thread([this, event_loop] {
-      Report("serving");
-      ndk::SpAIBinder binder(AServiceManager_checkService(ServiceInstanceName().c_str()));
-      std::shared_ptr<uwb::IUwb> service = uwb::IUwb::fromBinder(binder);
-      if (service != nullptr) {
-        std::vector<std::string> names;
-        Report("registered, interfaces " +
-               std::to_string(service->listIfaceNames(&names).isOk() ? names.size() : -1));
-        std::vector<int64_t> indices;
-        Report("hardware index status " +
-               std::to_string(service->listHardwareIndex(&indices).getStatus()));
-      }
-      event_loop->Quit();
-    });
-  }
+  void OnServing(LooperBackedEventLoop* event_loop) override { serving.set_value(event_loop); }
 
-  void Report(const std::string& line) {
-    android::base::WriteStringToFd(line + "\n", report_fd_);
-  }
-
- private:
-  const int report_fd_;
-  std::thread probe_;
+  std::promise<LooperBackedEventLoop*> serving;
 };
 
-TEST(ServiceMainTest, StartsAndRegistersInAChildProcessWithoutADriver) {
-  int fds[2];
-  ASSERT_EQ(pipe(fds), 0);
-  android::base::unique_fd read_end(fds[0]);
-  android::base::unique_fd write_end(fds[1]);
-  const pid_t child = fork();
-  ASSERT_GE(child, 0);
-  if (child == 0) {
-    read_end.reset();
-    const int report_fd = write_end.get();
-    android::base::SetLogger([report_fd](android::base::LogId, android::base::LogSeverity,
-                                         const char* tag, const char*, unsigned int,
-                                         const char* message) {
-      if (std::string(tag) == "dalix.uwb.main") {
-        android::base::WriteStringToFd(std::string("log: ") + message + "\n", report_fd);
-      }
-    });
-    int result;
-    {
-      ProbedDevicePlatform platform(report_fd);
-      result = RunService(&platform);
-    }
-    _exit(result);
+std::vector<std::string> MainLines(const LogCapture& log) {
+  std::vector<std::string> lines;
+  for (const LogCapture::Entry& entry : log.Entries()) {
+    if (entry.tag == "dalix.uwb.main") lines.push_back(entry.message);
   }
-  write_end.reset();
-  std::string report;
-  android::base::ReadFdToString(read_end.get(), &report);
-  int status = 0;
-  ASSERT_EQ(waitpid(child, &status, 0), child);
-  ASSERT_TRUE(WIFEXITED(status)) << report;
-  EXPECT_EQ(WEXITSTATUS(status), 0) << report;
-  // Start-up runs to the end and the service answers before any driver is
-  // asked; asking for the hardware is what first touches the driver, and
-  // with none there it fails.
-  std::vector<std::string> lines = android::base::Split(report, "\n");
-  EXPECT_THAT(lines, ElementsAre("log: UWB HAL start", "serving", "registered, interfaces 0",
-                                 "hardware index status " + std::to_string(STATUS_UNKNOWN_ERROR),
-                                 "log: UWB HAL is about to exit", ""));
+  return lines;
+}
+
+TEST(ServiceMainTest, StartsRegistersServesAndExitsWithoutADriver) {
+  LogCapture log;
+  DevicePlatform platform;
+  std::future<LooperBackedEventLoop*> serving = platform.serving.get_future();
+  int result = -1;
+  std::thread service([&] { result = RunService(&platform); });
+  LooperBackedEventLoop* event_loop = serving.get();
+  EXPECT_THAT(MainLines(log), ElementsAre("UWB HAL start"));
+
+  // Registered under its instance name before it serves; asking for the
+  // hardware is what first touches the driver, and with none there it fails.
+  const std::string instance = std::string(uwb::IUwb::descriptor) + "/default";
+  std::shared_ptr<uwb::IUwb> client =
+      uwb::IUwb::fromBinder(ndk::SpAIBinder(AServiceManager_checkService(instance.c_str())));
+  if (client != nullptr) {
+    std::vector<int64_t> indices;
+    EXPECT_EQ(client->listHardwareIndex(&indices).getStatus(), STATUS_UNKNOWN_ERROR);
+  } else {
+    ADD_FAILURE() << "not registered";
+  }
+  client.reset();
+  event_loop->Quit();
+  service.join();
+  ndk::host::ResetForTesting();
+  EXPECT_EQ(result, 0);
+  EXPECT_THAT(MainLines(log), ElementsAre("UWB HAL start", "UWB HAL is about to exit"));
 }
 
 }  // namespace

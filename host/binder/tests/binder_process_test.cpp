@@ -14,25 +14,26 @@
 
 namespace {
 
-constexpr char kDescriptor[] = "test.IThing";
-
 class IThing : public ndk::ICInterface {};
 
 class Thing : public ndk::BnCInterface<IThing> {
   ndk::SpAIBinder createBinder() override {
-    return ndk::host::NewLocalBinder(kDescriptor, ref<ndk::ICInterface>());
+    return ndk::host::NewLocalBinder("test.IThing", ref<ndk::ICInterface>());
   }
 };
 
-struct DeathRecord {
+// The cookie of a death link: counts its calls and, when asked, deletes its
+// own recipient from inside the call.
+struct Link {
+  AIBinder_DeathRecipient* recipient;
+  bool delete_in_callback = false;
   int calls = 0;
-  std::thread::id thread;
 };
 
-void RecordDeath(void* cookie) {
-  auto* record = static_cast<DeathRecord*>(cookie);
-  ++record->calls;
-  record->thread = std::this_thread::get_id();
+void OnDeath(void* cookie) {
+  auto* link = static_cast<Link*>(cookie);
+  ++link->calls;
+  if (link->delete_in_callback) AIBinder_DeathRecipient_delete(link->recipient);
 }
 
 // The long timeout only turns a broken queue into a failure instead of a hang.
@@ -52,100 +53,71 @@ class BinderProcessTest : public ::testing::Test {
 
   int fd_ = -1;
   std::shared_ptr<Thing> thing_ = ndk::SharedRefBase::make<Thing>();
-  ndk::SpAIBinder binder_ = thing_->asBinder();
-  ndk::ScopedAIBinder_DeathRecipient recipient_{AIBinder_DeathRecipient_new(RecordDeath)};
+  // Held by no one: a living object keeps its binder, which service code
+  // relies on when it links to a client object's binder without holding it.
+  AIBinder* const binder_ = thing_->asBinder().get();
+  ndk::ScopedAIBinder_DeathRecipient recipient_{AIBinder_DeathRecipient_new(OnDeath)};
 };
 
-TEST_F(BinderProcessTest, ClientCallWaitsForThePollingThread) {
-  std::thread::id ran_on;  // written by the call only, which runs on this thread
-  binder_status_t result = STATUS_UNKNOWN_ERROR;
-  std::thread client([&] {
-    result = ndk::host::Transact(binder_.get(), [&] { ran_on = std::this_thread::get_id(); });
-  });
-  ASSERT_TRUE(Readable(fd_));
-  EXPECT_EQ(std::thread::id(), ran_on) << "the call ran before the commands were handled";
-  EXPECT_EQ(STATUS_OK, ABinderProcess_handlePolledCommands());
-  client.join();
-  EXPECT_EQ(std::this_thread::get_id(), ran_on);
-  EXPECT_EQ(STATUS_OK, result);
-  EXPECT_FALSE(Readable(fd_, 0));
-}
-
-TEST_F(BinderProcessTest, ManyClientsAreServedOneCallAtATime) {
+TEST_F(BinderProcessTest, ClientCallsWaitForThePollingThreadAndRunThereOneAtATime) {
   constexpr int kClients = 4, kCallsEach = 50;
-  int total = 0;  // only the calls touch it, and they all run on this thread
+  std::vector<std::thread::id> ran_on;  // only the calls touch it, and they run on this thread
   std::atomic<int> finished{0};
   std::vector<std::thread> clients(kClients);
   for (std::thread& client : clients) {
     client = std::thread([&] {
-      for (int n = 0; n < kCallsEach; ++n) ndk::host::Transact(binder_.get(), [&] { ++total; });
+      for (int n = 0; n < kCallsEach; ++n) {
+        EXPECT_EQ(STATUS_OK, ndk::host::Transact(
+                                 binder_, [&] { ran_on.push_back(std::this_thread::get_id()); }));
+      }
       ++finished;
     });
   }
+  ASSERT_TRUE(Readable(fd_));
+  EXPECT_TRUE(ran_on.empty()) << "a call ran before the commands were handled";
   while (finished < kClients) {
     if (Readable(fd_, 20)) ABinderProcess_handlePolledCommands();
   }
   for (std::thread& client : clients) client.join();
-  EXPECT_EQ(kClients * kCallsEach, total);
+  EXPECT_EQ(std::vector(kClients * kCallsEach, std::this_thread::get_id()), ran_on);
+  ABinderProcess_handlePolledCommands();
+  EXPECT_FALSE(Readable(fd_, 0)) << "handling leaves the descriptor signalled";
 }
 
-TEST_F(BinderProcessTest, CallsFromTheServingThreadRunAtOnce) {
+// Handled on a thread other than the one that set up polling, the calls a
+// handler makes must not queue behind the handler itself.
+TEST_F(BinderProcessTest, CallsFromAHandlingThreadRunAtOnce) {
   int runs = 0;
-  EXPECT_EQ(STATUS_OK, ndk::host::Transact(binder_.get(), [&] { ++runs; }));
-  EXPECT_EQ(1, runs);
-  EXPECT_FALSE(Readable(fd_, 0));
-
-  // Handled on a thread other than the one that set up polling: the calls a
-  // handler makes must not queue behind the handler itself.
   std::thread client([&] {
-    ndk::host::Transact(binder_.get(),
-                        [&] { ndk::host::Transact(binder_.get(), [&] { ++runs; }); });
+    ndk::host::Transact(binder_, [&] { ndk::host::Transact(binder_, [&] { ++runs; }); });
   });
   ASSERT_TRUE(Readable(fd_));
   std::thread([] { ABinderProcess_handlePolledCommands(); }).join();
   client.join();
-  EXPECT_EQ(2, runs);
+  EXPECT_EQ(1, runs);
 }
 
 TEST_F(BinderProcessTest, KilledBinderNotifiesEachLinkOnceOnThePollingThread) {
-  DeathRecord first, second, unlinked;
-  for (DeathRecord* record : {&first, &second, &unlinked}) {
-    ASSERT_EQ(STATUS_OK, AIBinder_linkToDeath(binder_.get(), recipient_.get(), record));
+  Link first{recipient_.get()}, second{recipient_.get()}, unlinked{recipient_.get()};
+  for (Link* link : {&first, &second, &unlinked}) {
+    ASSERT_EQ(STATUS_OK, AIBinder_linkToDeath(binder_, recipient_.get(), link));
   }
-  EXPECT_EQ(STATUS_OK, AIBinder_unlinkToDeath(binder_.get(), recipient_.get(), &unlinked));
-  EXPECT_EQ(STATUS_NAME_NOT_FOUND,
-            AIBinder_unlinkToDeath(binder_.get(), recipient_.get(), &unlinked));
-  EXPECT_TRUE(AIBinder_isAlive(binder_.get()));
+  EXPECT_EQ(STATUS_OK, AIBinder_unlinkToDeath(binder_, recipient_.get(), &unlinked));
+  EXPECT_EQ(STATUS_NAME_NOT_FOUND, AIBinder_unlinkToDeath(binder_, recipient_.get(), &unlinked));
+  EXPECT_TRUE(AIBinder_isAlive(binder_));
 
-  std::thread([this] { ndk::host::KillBinder(binder_.get()); }).join();
-  EXPECT_FALSE(AIBinder_isAlive(binder_.get()));
-  EXPECT_EQ(STATUS_DEAD_OBJECT, AIBinder_ping(binder_.get()));
-  EXPECT_EQ(0, first.calls) << "delivered before the commands were handled";
+  std::thread([this] { ndk::host::KillBinder(binder_); }).join();
+  EXPECT_FALSE(AIBinder_isAlive(thing_->asBinder().get()));
+  EXPECT_EQ(STATUS_DEAD_OBJECT, AIBinder_ping(binder_));
+  EXPECT_EQ(0, first.calls) << "delivered before this thread handled the commands";
   ASSERT_TRUE(Readable(fd_));
   ABinderProcess_handlePolledCommands();
-  ndk::host::KillBinder(binder_.get());
+  ndk::host::KillBinder(binder_);
   ABinderProcess_handlePolledCommands();
 
-  EXPECT_EQ(1, first.calls);
-  EXPECT_EQ(1, second.calls);
-  EXPECT_EQ(0, unlinked.calls);
-  EXPECT_EQ(std::this_thread::get_id(), first.thread);
-  EXPECT_EQ(STATUS_DEAD_OBJECT, AIBinder_linkToDeath(binder_.get(), recipient_.get(), &first));
-  EXPECT_EQ(STATUS_DEAD_OBJECT, ndk::host::Transact(binder_.get(), [] {}));
-}
-
-// The cookie of a link that counts its deaths and, when asked, deletes its
-// own recipient from inside the call.
-struct SelfDeletingLink {
-  AIBinder_DeathRecipient* recipient;
-  bool delete_in_callback;
-  int calls = 0;
-};
-
-void OnLinkDeath(void* cookie) {
-  auto* link = static_cast<SelfDeletingLink*>(cookie);
-  ++link->calls;
-  if (link->delete_in_callback) AIBinder_DeathRecipient_delete(link->recipient);
+  EXPECT_EQ((std::vector{1, 1, 0}), (std::vector{first.calls, second.calls, unlinked.calls}));
+  EXPECT_EQ(STATUS_DEAD_OBJECT, AIBinder_linkToDeath(binder_, recipient_.get(), &first));
+  EXPECT_EQ(STATUS_DEAD_OBJECT, ndk::host::Transact(binder_, [] {}));
 }
 
 TEST_F(BinderProcessTest, DeletedRecipientIsNeverCalledAndMayDeleteItself) {
@@ -153,7 +125,7 @@ TEST_F(BinderProcessTest, DeletedRecipientIsNeverCalledAndMayDeleteItself) {
   for (When when : {kBeforeDeath, kWhileQueued, kInItsCallback}) {
     SCOPED_TRACE(when);
     ndk::SpAIBinder binder = ndk::SharedRefBase::make<Thing>()->asBinder();
-    SelfDeletingLink link{AIBinder_DeathRecipient_new(OnLinkDeath), when == kInItsCallback};
+    Link link{AIBinder_DeathRecipient_new(OnDeath), when == kInItsCallback};
     ASSERT_EQ(STATUS_OK, AIBinder_linkToDeath(binder.get(), link.recipient, &link));
     if (when == kBeforeDeath) AIBinder_DeathRecipient_delete(link.recipient);
     ndk::host::KillBinder(binder.get());
@@ -163,36 +135,19 @@ TEST_F(BinderProcessTest, DeletedRecipientIsNeverCalledAndMayDeleteItself) {
   }
 }
 
-TEST_F(BinderProcessTest, BinderKeepsItsObjectAndALivingObjectKeepsItsBinder) {
-  // Service code links to a client object's binder without holding the
-  // binder; a later kill of that binder must still reach the link.
-  auto thing = ndk::SharedRefBase::make<Thing>();
-  std::weak_ptr<Thing> watch = thing;
-  AIBinder* first = thing->asBinder().get();
-  DeathRecord record;
-  ASSERT_EQ(STATUS_OK, AIBinder_linkToDeath(thing->asBinder().get(), recipient_.get(), &record));
-  ndk::SpAIBinder binder = thing->asBinder();
-  EXPECT_EQ(first, binder.get());
+TEST_F(BinderProcessTest, BinderKeepsItsObject) {
+  std::weak_ptr<Thing> watch = thing_;
+  ndk::SpAIBinder binder = thing_->asBinder();
+  EXPECT_EQ(binder_, binder.get());
   EXPECT_EQ(1, AIBinder_debugGetRefCount(binder.get()));
-  ndk::host::KillBinder(binder.get());
-  binder.set(nullptr);
-  EXPECT_FALSE(AIBinder_isAlive(thing->asBinder().get()));
-  ABinderProcess_handlePolledCommands();
-  EXPECT_EQ(1, record.calls);
-
-  binder = thing->asBinder();
-  thing.reset();
-  EXPECT_FALSE(watch.expired()) << "the binder must keep its object";
+  thing_.reset();
+  EXPECT_FALSE(watch.expired());
   ndk::ScopedAIBinder_Weak weak(AIBinder_Weak_new(binder.get()));
   EXPECT_EQ(binder, weak.promote());
   binder.set(nullptr);
   EXPECT_TRUE(watch.expired());
   EXPECT_EQ(nullptr, weak.promote().get());
 }
-
-}  // namespace
-
-namespace {
 
 // make() is the only owner the device tolerates; anything else aborts here
 // at the first ref() or at destruction instead of being owned twice there.

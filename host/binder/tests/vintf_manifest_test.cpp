@@ -1,103 +1,61 @@
 #include "vintf_manifest.h"
 
-#include <stdio.h>
-#include <unistd.h>
-
-#include <memory>
+#include <cstdio>
+#include <fstream>
+#include <optional>
 #include <string>
 
-#include <android/binder_manager.h>
-#include <binder_host/host.h>
 #include <gtest/gtest.h>
 
 namespace {
 
 using ndk::host::VintfManifest;
 
-struct ManifestCase {
-  const char* name;
-  const char* xml;
-  bool loads;
-  const char* declared;      // a name the manifest must declare, or null
-  const char* not_declared;  // a name it must not declare, or null
-  int version;
-};
-
-const ManifestCase kCases[] = {
-    {"FqName", "<manifest><hal format='aidl'><name>a.b</name><version>2</version>"
-               "<fqname>IFoo/default</fqname></hal></manifest>",
-     true, "a.b.IFoo/default", "a.b.IFoo/other", 2},
-    {"InterfaceBlock", "<manifest><hal format='aidl'><name>a.b</name><interface><name>IFoo"
-                       "</name><instance>x</instance><instance>y</instance></interface></hal>"
-                       "</manifest>",
-     true, "a.b.IFoo/y", "a.c.IFoo/x", 1},
-    {"HidlEntriesDeclareNoAidl", "<manifest><hal format='hidl'><name>a.b</name>"
-                                 "<fqname>@1.0::IFoo/default</fqname></hal></manifest>",
-     true, nullptr, "a.b.IFoo/default", 0},
-    {"NotWellFormed", "<manifest><hal format='aidl'><name>a.b</name></manifest>", false, nullptr, nullptr, 0},
-    {"WrongRoot", "<compatibility-matrix/>", false, nullptr, nullptr, 0},
-    {"VersionNotANumber", "<manifest><hal format='aidl'><name>a.b</name><version>1x</version>"
-                          "<fqname>IFoo/default</fqname></hal></manifest>", false, nullptr, nullptr, 0},
-    {"VersionZero", "<manifest><hal format='aidl'><name>a.b</name><version>0</version>"
-                    "<fqname>IFoo/default</fqname></hal></manifest>", false, nullptr, nullptr, 0},
-    {"FqNameWithoutInstance", "<manifest><hal format='aidl'><name>a.b</name>"
-                              "<fqname>IFoo/</fqname></hal></manifest>", false, nullptr, nullptr, 0},
-    {"NoInstance", "<manifest><hal format='aidl'><name>a.b</name></hal></manifest>", false, nullptr, nullptr, 0},
-};
-
-class VintfManifestTest : public ::testing::TestWithParam<ManifestCase> {};
-
-TEST_P(VintfManifestTest, Loads) {
-  const ManifestCase& c = GetParam();
-  char path[] = "/tmp/vintf_manifest_test_XXXXXX";
-  const int fd = mkstemp(path);
-  ASSERT_GE(fd, 0);
-  ASSERT_EQ(static_cast<ssize_t>(strlen(c.xml)), write(fd, c.xml, strlen(c.xml)));
-  close(fd);
-  std::string error;
-  std::optional<VintfManifest> manifest = VintfManifest::Load(path, &error);
-  unlink(path);
-  ASSERT_EQ(c.loads, manifest.has_value()) << error;
-  if (!c.loads) {
-    EXPECT_NE(std::string::npos, error.find(path)) << error;
-    return;
-  }
-  if (c.declared != nullptr) {
-    EXPECT_TRUE(manifest->Declares(c.declared));
-    EXPECT_EQ(c.version, manifest->instances().front().version);
-  }
-  EXPECT_FALSE(manifest->Declares(c.not_declared));
+// An AIDL entry of package a.b with |body| inside.
+std::string Aidl(const std::string& body) {
+  return "<manifest><hal format='aidl'><name>a.b</name>" + body + "</hal></manifest>";
 }
 
-INSTANTIATE_TEST_SUITE_P(Manifests, VintfManifestTest, ::testing::ValuesIn(kCases),
-                         [](const auto& info) { return std::string(info.param.name); });
-
-class IThing : public ndk::ICInterface {};
-class Thing : public ndk::BnCInterface<IThing> {
-  ndk::SpAIBinder createBinder() override {
-    return ndk::host::NewLocalBinder("test.IThing", ref<ndk::ICInterface>());
+TEST(VintfManifestTest, DeclaresTheAidlInstancesOfAWellFormedManifestOnly) {
+  const struct {
+    std::string xml;
+    const char* declared = nullptr;      // declared, at |version|, as the first instance
+    const char* not_declared = nullptr;  // not declared; null: the manifest must not load
+    int version = 0;
+  } cases[] = {
+      {Aidl("<version>2</version><fqname>IFoo/default</fqname>"), "a.b.IFoo/default",
+       "a.b.IFoo/other", 2},
+      {Aidl("<interface><name>IFoo</name><instance>x</instance><instance>y</instance></interface>"),
+       "a.b.IFoo/x", "a.c.IFoo/y", 1},
+      {"<manifest><hal format='hidl'><name>a.b</name><fqname>@1.0::IFoo/default</fqname></hal>"
+       "</manifest>",
+       nullptr, "a.b.IFoo/default"},
+      {"<manifest><hal format='aidl'><name>a.b</name></manifest>"},  // not well-formed
+      {"<compatibility-matrix/>"},
+      {Aidl("<version>1x</version><fqname>IFoo/default</fqname>")},
+      {Aidl("<version>0</version><fqname>IFoo/default</fqname>")},
+      {Aidl("<fqname>IFoo/</fqname>")},
+      {Aidl("")},
+  };
+  const std::string path = ::testing::TempDir() + "vintf_manifest_test.xml";
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.xml);
+    std::ofstream(path) << c.xml;
+    std::string error;
+    std::optional<VintfManifest> manifest = VintfManifest::Load(path, &error);
+    ASSERT_EQ(c.not_declared != nullptr, manifest.has_value()) << error;
+    if (!manifest.has_value()) {
+      EXPECT_NE(std::string::npos, error.find(path)) << error;
+      continue;
+    }
+    if (c.declared != nullptr) {
+      EXPECT_TRUE(manifest->Declares(c.declared));
+      EXPECT_EQ(c.declared, manifest->instances().front().Name());
+      EXPECT_EQ(c.version, manifest->instances().front().version);
+    }
+    EXPECT_FALSE(manifest->Declares(c.not_declared));
   }
-};
-
-// The registry takes only what the service's fragment declares, as the
-// device's service manager does.
-TEST(ServiceManagerTest, RegistersOnlyDeclaredInstances) {
-  ndk::host::ResetForTesting();
-  std::string error;
-  std::optional<VintfManifest> manifest = VintfManifest::Load(DALIX_VINTF_FRAGMENT, &error);
-  ASSERT_TRUE(manifest.has_value()) << error;
-  ASSERT_FALSE(manifest->instances().empty());
-  const std::string declared = manifest->instances().front().Name();
-  auto thing = ndk::SharedRefBase::make<Thing>();
-  for (const std::string& name : {declared + "2", "x" + declared, std::string("test.IThing")}) {
-    EXPECT_EQ(EX_ILLEGAL_ARGUMENT, AServiceManager_addService(thing->asBinder().get(),
-                                                              name.c_str())) << name;
-    EXPECT_EQ(nullptr, AServiceManager_checkService(name.c_str())) << name;
-  }
-  EXPECT_EQ(EX_NONE, AServiceManager_addService(thing->asBinder().get(), declared.c_str()));
-  ndk::SpAIBinder found(AServiceManager_checkService(declared.c_str()));
-  EXPECT_EQ(thing->asBinder().get(), found.get());
-  ndk::host::ResetForTesting();
+  std::remove(path.c_str());
 }
 
 }  // namespace

@@ -33,5 +33,30 @@ inline aidl::hardware::dalix::uwb::FiraTwrSession ValidFiraSession(
   return session;
 }
 
+// ValidFiraSession as a driver controller (interface value 1) that also sets
+// most optional switches, ranging with 0x5678 and 0x9abc.
+inline aidl::hardware::dalix::uwb::FiraTwrSession FullFiraSession(int32_t id) {
+  namespace uwb = aidl::hardware::dalix::uwb;
+  uwb::FiraTwrSession s = ValidFiraSession(id, {0x5678, 0x9abc});
+  s.deviceType = uwb::DeviceType(1);
+  s.deviceRole = uwb::DeviceRole(1);
+  s.multiNodeMode = uwb::MultiNodeMode(1);
+  s.initiationTimeMs = 10;
+  s.blockStridingValue = 3;
+  s.maxRangingRoundRetries = 5;
+  s.isHoppingEnabled = true;
+  s.sessionPriority = 50;
+  s.rangingRoundControl.hasResultReportPhase = true;
+  s.rframeConfig = uwb::RframeConfig(3);
+  s.preambleDuration = uwb::PreambleDuration(1);
+  s.sfdId = 2;
+  s.stsSegmentCount = 1;
+  s.bprfPhrDataRate = uwb::BprfPhrDataRate(1);
+  s.subSessionId = 7;
+  s.aoaResultRequest = uwb::AoaResultRequest(1);
+  s.resultReportConfig = {true, true, false, true};
+  return s;
+}
+
 }  // namespace dalix
 }  // namespace hardware

@@ -3,6 +3,7 @@
 #include <chrono>
 #include <cmath>
 #include <functional>
+#include <map>
 #include <string>
 #include <vector>
 
@@ -44,6 +45,13 @@ uwb::FiraTwrSession AngleSession(int32_t id) {
   s.resultReportConfig = {true, true, true, true};
   return s;
 }
+
+// What FullFiraSession sends on a radio without antenna properties.
+const std::map<int, uint32_t> kFullSessionParams = {
+    {1, 0},   {2, 1},   {3, 2},  {4, 1},  {5, 0x0001}, {6, 0x5678}, {7, 10}, {8, 2400},
+    {9, 200}, {10, 25}, {12, 5}, {13, 1}, {15, 50},    {18, 0},     {19, 1}, {20, 9},
+    {21, 10}, {22, 3},  {23, 0}, {25, 2}, {26, 1},     {27, 0},     {28, 1}, {34, 1},
+    {32, 0},  {36, 1},  {43, 1}, {44, 1}, {45, 1},     {47, 1}};
 
 // The service's FiraRegionUtils against the simulated FiRa region, over real
 // sockets and the real event loop.
@@ -164,6 +172,98 @@ TEST_F(FiraRegionSimTest, SessionRangesTheWorldsPeersUntilStopped) {
   EXPECT_EQ(kept.controlees.size(), 2u);
   ASSERT_TRUE(fira_.DeinitSession(0, 5));
   EXPECT_FALSE(region_.Session(0, 5));
+}
+
+// What the driver keeps of a session's configuration, on a radio without
+// antenna properties: every parameter the session calls for, each at its own
+// width, and nothing else.
+TEST_F(FiraRegionSimTest, ConfigurationReachesTheDriverAsTheSessionCallsFor) {
+  const struct {
+    const char* name;
+    std::function<void(uwb::FiraTwrSession&)> change;
+    std::map<int, int64_t> delta;  // -1: not sent
+  } cases[] = {
+      {"base", [](uwb::FiraTwrSession&) {}, {}},
+      {"driver controlee: no destination, its report phases",
+       [](uwb::FiraTwrSession& s) {
+         s.deviceType = uwb::DeviceType(0);
+         s.stsConfig = uwb::FiraStsConfig(2);
+         s.rangingRoundControl = {false, uwb::MeasurementReportType(1), true};
+       },
+       {{1, 1}, {6, -1}, {16, 0}, {17, 1}, {18, -1}, {36, 2}}},
+      {"driver controller: no report phases, a sub-session",
+       [](uwb::FiraTwrSession& s) {
+         s.stsConfig = uwb::FiraStsConfig(2);
+         s.rangingRoundControl = {false, uwb::MeasurementReportType(1), false};
+       },
+       {{36, 2}, {37, 7}}},
+      {"static STS: IV then vendor id",
+       [](uwb::FiraTwrSession& s) {
+         s.stsConfig = uwb::FiraStsConfig(0);
+         s.staticStsIV = {1, 2, 3, 4, 5, 6};
+         s.vendorId = {0xa, 0xb};
+       },
+       {{36, 0}, {38, -1}}},  // The key is kept apart.
+      {"block striding",
+       [](uwb::FiraTwrSession& s) { s.isBlockStridingEnabled = true; },
+       {{11, 3}, {14, 1}}},
+      {"no retries", [](uwb::FiraTwrSession& s) { s.maxRangingRoundRetries = 0; }, {{12, -1}}},
+      {"negative retries",
+       [](uwb::FiraTwrSession& s) { s.maxRangingRoundRetries = -1; },
+       {{12, -1}}},
+      {"no angles, whatever the type",
+       [](uwb::FiraTwrSession& s) {
+         s.aoaResultRequest = uwb::AoaResultRequest(0);
+         s.aoaType = uwb::AoaType(7);
+       },
+       {{43, -1}}},
+      {"elevation",
+       [](uwb::FiraTwrSession& s) { s.aoaType = uwb::AoaType(1); },
+       {{32, -1}, {33, 255}}},
+      {"both in pair mode",
+       [](uwb::FiraTwrSession& s) {
+         s.aoaType = uwb::AoaType(2);
+         s.deviceRole = uwb::DeviceRole(0);
+       },
+       {{2, 0}, {33, 255}, {35, 1}}},
+      {"both", [](uwb::FiraTwrSession& s) { s.aoaType = uwb::AoaType(2); }, {{33, 255}, {35, 0}}},
+      {"other switches",
+       [](uwb::FiraTwrSession& s) {
+         s.isKeyRotationEnabled = s.isTxAdaptivePayloadPowerEnabled = true;
+         s.keyRotationRate = 4;
+         s.fcsType = uwb::FcsType(1);
+         s.isHoppingEnabled = false;
+         s.rangingRoundControl.hasDeferredMode = true;
+         s.prfMode = uwb::PrfMode(1);
+         s.preambleDuration = uwb::PreambleDuration(0);
+         s.bprfPhrDataRate = uwb::BprfPhrDataRate(0);
+       },
+       {{41, 1}, {42, 4}, {30, 1}, {29, 1}, {13, -1}, {18, -1}, {23, -1}, {24, 0}, {28, -1}}},
+      {"signed and wide values",
+       [](uwb::FiraTwrSession& s) {
+         s.inBandTerminationAttemptCount = -1;
+         s.channelNumber = 0x109;
+         s.sessionPriority = -56;
+       },
+       {{19, 0xffffffff}, {20, 9}, {15, 200}}},
+  };
+  int32_t id = 100;
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.name);
+    uwb::FiraTwrSession session = FullFiraSession(++id);
+    c.change(session);
+    std::map<int, uint32_t> expected = kFullSessionParams;
+    for (auto [attr, value] : c.delta) {
+      if (value == -1) expected.erase(attr);
+      if (value >= 0) expected[attr] = static_cast<uint32_t>(value);
+    }
+    ASSERT_TRUE(fira_.InitSession(1, id));
+    ASSERT_TRUE(fira_.ConfigTwrSession(1, session));
+    const SimFiraSession kept = region_.Session(1, id).value();
+    EXPECT_EQ(kept.params, expected);
+    const std::vector<uint8_t> key = {1, 2, 3, 4, 5, 6, 0xa, 0xb};
+    EXPECT_EQ(kept.static_sts_key, c.delta.count(38) ? key : std::vector<uint8_t>{});
+  }
 }
 
 TEST_F(FiraRegionSimTest, SessionsOnTwoRadiosShareOneSocketUntilTheLastUnsubscribes) {

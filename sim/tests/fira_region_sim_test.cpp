@@ -183,12 +183,14 @@ TEST_F(FiraRegionSimTest, ConfigurationReachesTheDriverAsTheSessionCallsFor) {
          s.rangingRoundControl = {false, uwb::MeasurementReportType(1), true};
        },
        {{1, 1}, {6, -1}, {16, 0}, {17, 1}, {18, -1}, {36, 2}}},
-      {"driver controller: no report phases, a sub-session",
+      {"driver controller: no report phases, a sub-session; no angles, whatever the type",
        [](uwb::FiraTwrSession& s) {
          s.stsConfig = uwb::FiraStsConfig(2);
          s.rangingRoundControl = {false, uwb::MeasurementReportType(1), false};
+         s.aoaResultRequest = uwb::AoaResultRequest(0);
+         s.aoaType = uwb::AoaType(7);
        },
-       {{36, 2}, {37, 7}}},
+       {{36, 2}, {37, 7}, {43, -1}}},
       {"static STS: IV then vendor id",
        [](uwb::FiraTwrSession& s) {
          s.stsConfig = uwb::FiraStsConfig(0);
@@ -196,22 +198,12 @@ TEST_F(FiraRegionSimTest, ConfigurationReachesTheDriverAsTheSessionCallsFor) {
          s.vendorId = {0xa, 0xb};
        },
        {{36, 0}, {38, -1}}},  // The key is kept apart.
-      {"block striding",
-       [](uwb::FiraTwrSession& s) { s.isBlockStridingEnabled = true; },
-       {{11, 3}, {14, 1}}},
-      {"no retries", [](uwb::FiraTwrSession& s) { s.maxRangingRoundRetries = 0; }, {{12, -1}}},
-      {"negative retries",
-       [](uwb::FiraTwrSession& s) { s.maxRangingRoundRetries = -1; },
-       {{12, -1}}},
-      {"no angles, whatever the type",
+      {"elevation, no retries",
        [](uwb::FiraTwrSession& s) {
-         s.aoaResultRequest = uwb::AoaResultRequest(0);
-         s.aoaType = uwb::AoaType(7);
+         s.aoaType = uwb::AoaType(1);
+         s.maxRangingRoundRetries = 0;
        },
-       {{43, -1}}},
-      {"elevation",
-       [](uwb::FiraTwrSession& s) { s.aoaType = uwb::AoaType(1); },
-       {{32, -1}, {33, 255}}},
+       {{12, -1}, {32, -1}, {33, 255}}},
       {"both in pair mode",
        [](uwb::FiraTwrSession& s) {
          s.aoaType = uwb::AoaType(2);
@@ -219,7 +211,7 @@ TEST_F(FiraRegionSimTest, ConfigurationReachesTheDriverAsTheSessionCallsFor) {
        },
        {{2, 0}, {33, 255}, {35, 1}}},
       {"both", [](uwb::FiraTwrSession& s) { s.aoaType = uwb::AoaType(2); }, {{33, 255}, {35, 0}}},
-      {"other switches",
+      {"other switches, negative retries, signed and wide values",
        [](uwb::FiraTwrSession& s) {
          s.isKeyRotationEnabled = s.isTxAdaptivePayloadPowerEnabled = true;
          s.keyRotationRate = 4;
@@ -229,15 +221,27 @@ TEST_F(FiraRegionSimTest, ConfigurationReachesTheDriverAsTheSessionCallsFor) {
          s.prfMode = uwb::PrfMode(1);
          s.preambleDuration = uwb::PreambleDuration(0);
          s.bprfPhrDataRate = uwb::BprfPhrDataRate(0);
-       },
-       {{41, 1}, {42, 4}, {30, 1}, {29, 1}, {13, -1}, {18, -1}, {23, -1}, {24, 0}, {28, -1}}},
-      {"signed and wide values",
-       [](uwb::FiraTwrSession& s) {
+         s.isBlockStridingEnabled = true;
+         s.maxRangingRoundRetries = -1;
          s.inBandTerminationAttemptCount = -1;
          s.channelNumber = 0x109;
          s.sessionPriority = -56;
        },
-       {{19, 0xffffffff}, {20, 9}, {15, 200}}},
+       {{11, 3},
+        {12, -1},
+        {13, -1},
+        {14, 1},
+        {15, 200},
+        {18, -1},
+        {19, 0xffffffff},
+        {20, 9},
+        {23, -1},
+        {24, 0},
+        {28, -1},
+        {29, 1},
+        {30, 1},
+        {41, 1},
+        {42, 4}}},
   };
   int32_t id = 100;
   for (const auto& c : cases) {

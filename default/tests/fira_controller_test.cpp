@@ -8,7 +8,6 @@
 #include <tuple>
 #include <vector>
 
-#include <android-base/logging.h>
 #include <android-base/strings.h>
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
@@ -79,8 +78,6 @@ TEST(CheckTwrSessionFieldsTest, FirstFailedCheckGivesItsMessage) {
     std::function<void(FiraTwrSession&)> change;
     std::string message;  // empty when the session passes
   } cases[] = {
-      {SET(deviceAddress.address, std::vector<uint8_t>(8)),
-       "deviceAddress has incorrect size, " + kShortOnly},
       {SET(initiationTimeMs, (s.deviceAddress.address.pop_back(), -1)),
        "deviceAddress has incorrect size, " + kShortOnly},
       {SET(initiationTimeMs, -1), "initiationTimeMs cannot be negative."},
@@ -89,7 +86,6 @@ TEST(CheckTwrSessionFieldsTest, FirstFailedCheckGivesItsMessage) {
       {SET(rangingBlockDurationMs, -1), "rangingBlockDurationMs cannot be negative."},
       {SET(blockStridingValue, -1), "blockStridingValue cannot be negative."},
       {SET(maxRangingRoundRetries, -1), "maxRangingRoundRetries cannot be negative."},
-      {SET(aoaType, AoaType::AZIMUTH_AND_ELEVATION), ""},
       {SET(aoaType, AoaType(3)), "Unsupported AoaType: 3"},
       {SET(aoaType, AoaType(-1)), "Unsupported AoaType: -1"},
       {SET(sessionPriority, 100), ""},
@@ -98,19 +94,15 @@ TEST(CheckTwrSessionFieldsTest, FirstFailedCheckGivesItsMessage) {
       {SET(inBandTerminationAttemptCount, 0), "Incorrect inBandTerminationAttemptCount value 0"},
       {SET(inBandTerminationAttemptCount, 10), ""},
       {SET(inBandTerminationAttemptCount, 11), "Incorrect inBandTerminationAttemptCount value 11"},
-      {SET(inBandTerminationAttemptCount, -2),
-       "Incorrect inBandTerminationAttemptCount value 4294967294"},
       {SET(channelNumber, 15), ""},
       {SET(channelNumber, 16), "Incorrect channel value 16"},
       {SET(channelNumber, -1), "Incorrect channel value -1"},
       {SET(sfdId, 4), ""},
-      {SET(sfdId, -3), ""},
       {SET(sfdId, 5), "Incorrect sfdId value 5"},
       {SET(destAddressList, {}),
        "The device is controller of the session, destAddressList should not be empty"},
       {SET(destAddressList, (std::vector<UwbAddress>{{{0, 2}}, {{1, 2, 3}}})),
        "destAddressList contains an incorrect address, " + kShortOnly},
-      {Sts(FiraStsConfig::STATIC, 2, 6), ""},
       {Sts(FiraStsConfig::STATIC, 0, 6), kStaticSize + "2"},
       {Sts(FiraStsConfig::STATIC, 2, 5), kStaticSize + "6"},
       {Sts(FiraStsConfig::DYNAMIC, 2, 0),
@@ -129,11 +121,8 @@ TEST(CheckTwrSessionFieldsTest, FirstFailedCheckGivesItsMessage) {
 }
 #undef SET
 
-// One call on the controller, named after the operation it makes.
-struct Op {
-  std::string name;  // empty for the driver's reports, which log nothing
-  std::function<ScopedAStatus(FiraController&)> run;
-};
+// One call on the controller.
+using Op = std::function<ScopedAStatus(FiraController&)>;
 
 // The controller on strict mocks that play one radio: its scheduler, its
 // interface flag and the calls a case makes it refuse. Every call that
@@ -244,14 +233,14 @@ class FiraControllerTest : public ::testing::Test {
       if (token[0] == '@') scheduler_ = token.substr(1);
     }
     LogCapture log;
-    const ScopedAStatus status = c.op.run(*controller_);
+    const ScopedAStatus status = c.op(*controller_);
     const std::vector<std::string> during = callback_->Events();
     calls_.insert(calls_.end(), during.begin(), during.end());
     if (!tasks_.empty()) calls_.push_back("|");
     for (const auto& task : tasks_) task();
     const std::vector<std::string> after = callback_->Events();
     calls_.insert(calls_.end(), after.begin() + during.size(), after.end());
-    EXPECT_EQ(c.expected, Outcome(status)) << c.op.name;
+    EXPECT_EQ(c.expected, Outcome(status));
     for (const auto& line : log.Entries()) {
       if (line.severity == android::base::ERROR && line.tag == kTag) errors_ += line.message + "\n";
     }
@@ -274,20 +263,14 @@ class FiraControllerTest : public ::testing::Test {
 
 // A call of the controller's |method| with the arguments that follow.
 // clang-format off
-#define OP(method, ...) Op{#method, [=](FiraController& c) { return c.method(__VA_ARGS__); }}
+#define OP(method, ...) [=](FiraController& c) { return c.method(__VA_ARGS__); }
 // clang-format on
 
-Op Twice(Op op) {
-  return {op.name, [op](FiraController& c) {
-            (void)op.run(c);
-            return op.run(c);
-          }};
-}
 Op Stopped(uint32_t id) {
-  return {"", [id](FiraController& c) {
-            c.OnSessionStopped(id);
-            return ScopedAStatus::ok();
-          }};
+  return [id](FiraController& c) {
+    c.OnSessionStopped(id);
+    return ScopedAStatus::ok();
+  };
 }
 FiraTwrSession Controlee(int32_t id) {
   FiraTwrSession session = ValidFiraSession(id);
@@ -297,10 +280,10 @@ FiraTwrSession Controlee(int32_t id) {
 
 TEST_F(FiraControllerTest, EveryOperationFromEveryState) {
   const std::vector<UwbAddress> kOne = {{{0, 7}}}, kTwo = {{{0, 7}}, {{0, 8}}};
-  const Op kResult = {"", [](FiraController& c) {
-                        c.OnTwrResult({1, 0}, {});
-                        return ScopedAStatus::ok();
-                      }};
+  const Op kResult = [](FiraController& c) {
+    c.OnTwrResult({1, 0}, {});
+    return ScopedAStatus::ok();
+  };
   const std::string kNoCallback = "-7 You need to register callbacks on the controller first.||";
   const Case cases[] = {
       // Sessions are created with the region set and the interface down.
@@ -314,15 +297,12 @@ TEST_F(FiraControllerTest, EveryOperationFromEveryState) {
       {kEmpty, OP(initNewTwrSession, ValidFiraSession(1)), "!Fira", "-7|Hw Up? Up0 Fira|#0"},
       // Failing half-way leaves the driver's session but not the controller's.
       {kInit, OP(initNewTwrSession, ValidFiraSession(2)), "!Config", "-7|Hw Init2 Config2|1:0 #0"},
-      {kRun, OP(initNewTwrSession, ValidFiraSession(2)), "!Up",
-       "-7|Hw Init2 Config2 Up? Up0|1:1 #1"},
       {kInit, OP(initNewTwrSession, ValidFiraSession(2)), "!Addr",
        "-7|Hw Init2 Config2 Up? Addr|1:0 #0"},
       {kInit, OP(initNewTwrSession, ValidFiraSession(2)), "!Add",
        "-7|Hw Init2 Config2 Up? Addr Add2|1:0 #0"},
 
       {kInit, OP(updateTwrSession, ValidFiraSession(1)), "", "0|Hw Config1|1:0 #0"},
-      {kInit, OP(updateTwrSession, ValidFiraSession(1)), "!Config", "-7|Hw Config1|1:0 #0"},
       {kInit, OP(updateTwrSession, ValidFiraSession(7)), "", "-3 Unknown session id 7||1:0 #0"},
       {kRun, OP(updateTwrSession, ValidFiraSession(1)), "",
        "-5 Running session cannot be updated||1:1 #1"},
@@ -334,7 +314,6 @@ TEST_F(FiraControllerTest, EveryOperationFromEveryState) {
       {kInitNoCallback, OP(startRangingSession, 9), "", kNoCallback + "1:0 #0"},
       {kInit, OP(startRangingSession, -1), "", "-3 Unknown session id 4294967295||1:0 #0"},
       {kRun, OP(startRangingSession, 1), "", "-5 The session is already running||1:1 #1"},
-      {kInit, OP(startRangingSession, 1), "!Hw", "-7|Hw|1:0 #0"},
       {kInit, OP(startRangingSession, 1), "!Up", "-7|Hw Up? Up1|1:0 #0"},
       // A refused start is rolled back; the last one unsubscribes.
       {kInit, OP(startRangingSession, 1), "!Start",
@@ -358,12 +337,10 @@ TEST_F(FiraControllerTest, EveryOperationFromEveryState) {
        "-3 Controlees size and sub-session id size do not match||1:0 #0"},
       {kInit, OP(removeControlees, 1, kOne), "", "0|Del1 Post | onRemoved1|1:0 #0"},
       {kRun, OP(removeControlees, 1, kOne), "!Del", "0|Del1 Post | onRemoveFailed1|1:1 #1"},
-      {kInitNoCallback, OP(removeControlees, 1, kOne), "!Del", "0|Del1|1:0 #0"},
       {kInit, OP(removeControlees, 3, kOne), "", "-3 Unknown session id 3||1:0 #0"},
 
       // The session runs until the driver reports its stop.
-      {kRun, Twice(OP(stopRangingSession, 1)), "", "0|Hw Stop1 Hw Stop1|1:1 #1"},
-      {kRun, OP(stopRangingSession, 1), "!Stop", "-7|Hw Stop1|1:1 #1"},
+      {kRun, OP(stopRangingSession, 1), "", "0|Hw Stop1|1:1 #1"},
       {kRun, OP(stopRangingSession, 2), "", "-3 Unknown session id 2||1:1 #1"},
       {kRunInit, OP(stopRangingSession, 2), "", "-5 The session isn't started.||1:1 2:0 #1"},
       {kRun, OP(stopRangingSession, 1), "@simple-ranging", "-7|Hw Unsub Up? Up0|#0"},
@@ -374,13 +351,10 @@ TEST_F(FiraControllerTest, EveryOperationFromEveryState) {
       {kInit, OP(deinitSession, 1), "!Deinit", "-7|Hw Deinit1|1:0 #0"},
       {kInit, OP(deinitSession, 2), "", "-3 Unknown session id 2||1:0 #0"},
       {kRun, OP(deinitSession, 1), "", "-5 The session is started, call stop first.||1:1 #1"},
-      {kInit, OP(deinitSession, 1), "!Hw", "-7|Hw|1:0 #0"},
       {kRunInit, OP(deinitSession, 2), "@default", "0|Hw Unsub Up?|#0"},
 
       {kRun, OP(reset), "", "0|Up? Up0 Hw Sched Unsub Up?|#0"},
-      {kInit, Twice(OP(reset)), "", "0|Up? Hw Sched Unsub Up? Up? Hw Unsub Up?|#0"},
       {kRun, OP(reset), "!Up", "-7|Up? Up0|1:1 #1"},
-      {kRun, OP(reset), "!Hw", "-7|Up? Up0 Hw|1:1 #1"},
       {kInit, OP(reset), "!Sched", "-7|Up? Hw Sched|1:0 #0"},
 
       {kRunInit, Stopped(1), "", "0|Unsub Up? onStopped1|1:0 2:0 #0"},

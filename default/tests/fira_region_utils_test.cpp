@@ -43,27 +43,16 @@ constexpr uint32_t kFamily = 0x1d;
 constexpr uint32_t kHw = 3;
 constexpr char kTag[] = "dalix.uwb.FiraRegionUtils";
 
-// The region call content of a notification whose index (or else one
-// measurement's address and another's angle) has the wrong width.
-void PutBadlySizedNotification(nl_msg* m, bool bad_index) {
-  nla_put_string(m, MCPS802154_REGION_CALL_ATTR_REGION_NAME, "fira");
-  nla_put_u32(m, MCPS802154_REGION_CALL_ATTR_CALL, FIRA_CALL_SESSION_NOTIFICATION);
-  nlattr* params = nla_nest_start(m, MCPS802154_REGION_CALL_ATTR_CALL_PARAMS);
-  nla_put_u32(m, FIRA_SESSION_NTF_ATTR_SESSION_ID, 1);
-  nlattr* data = nla_nest_start(m, FIRA_SESSION_NTF_ATTR_RANGING_DATA);
-  if (bad_index) nla_put_u16(m, FIRA_RANGING_DATA_ATTR_INDEX, 1);
-  if (!bad_index) nla_put_u32(m, FIRA_RANGING_DATA_ATTR_INDEX, 1);
-  nlattr* list = nla_nest_start(m, FIRA_RANGING_DATA_ATTR_MEASUREMENTS);
-  nlattr* first = nla_nest_start(m, 1);
-  nla_put_u8(m, FIRA_MEASUREMENT_ATTR_SHORT_ADDR, 1);
-  nla_nest_end(m, first);
-  nlattr* second = nla_nest_start(m, 2);
-  nla_put_u16(m, FIRA_MEASUREMENT_ATTR_SHORT_ADDR, 1);
-  nla_put_u8(m, FIRA_MEASUREMENT_ATTR_STATUS, 0);
-  nla_put_u32(m, FIRA_MEASUREMENT_ATTR_DISTANCE, 1);
-  nlattr* aoa = nla_nest_start(m, FIRA_MEASUREMENT_ATTR_AOA_AZIMUTH);
-  nla_put_u8(m, FIRA_AOA_ATTR_FIRST_ANGLE, 1);
-  for (nlattr* nest : {aoa, second, list, data, params}) nla_nest_end(m, nest);
+// Shortens the payload of the attribute at |path|, each type found inside the
+// one before, to |bytes|: the message's layout stays as it was.
+void Shorten(nl_msg* msg, std::initializer_list<int> path, int bytes) {
+  nlattr* attr = nullptr;
+  for (int type : path) {
+    attr = attr == nullptr ? nlmsg_find_attr(nlmsg_hdr(msg), GENL_HDRLEN, type)
+                           : nla_find(static_cast<nlattr*>(nla_data(attr)), nla_len(attr), type);
+    ASSERT_NE(attr, nullptr) << type;
+  }
+  attr->nla_len = static_cast<uint16_t>(NLA_HDRLEN + bytes);
 }
 
 // A result of session 77 on |kHw| with |measurements|.
@@ -304,29 +293,20 @@ TEST_F(FiraRegionUtilsTest, NotificationsDecodeEdgeValuesAndDropBrokenMeasuremen
 
 TEST_F(FiraRegionUtilsTest, MessagesThatAreNotResultsAreDroppedWithTheirLine) {
   fira_.SubscribeCallback(kHw, &recorder_);
-  // |fill| puts the attributes after the generic netlink header.
-  auto raw = [](std::function<void(nl_msg*)> fill) {
-    auto msg = std::make_shared<UniqueNlMsg>();
-    genlmsg_put(msg->get(), 0, 0, kFamily, 0, 0, MCPS802154_CMD_CALL_REGION, 1);
-    fill(msg->get());
-    return msg;
-  };
-  // A region call whose nest holds what |fill| puts.
-  auto call = [&](std::function<void(nl_msg*)> fill) {
-    return raw([&](nl_msg* m) {
-      nla_put_u32(m, MCPS802154_ATTR_HW, kHw);
-      nlattr* nest = nla_nest_start(m, MCPS802154_ATTR_SCHEDULER_REGION_CALL);
-      fill(m);
-      nla_nest_end(m, nest);
-    });
-  };
-  auto encoded = [](std::function<void(FiraNotificationData&)> change) {
+  // A notification encoded as the driver would, then |mutate|d.
+  auto encoded = [](std::function<void(FiraNotificationData&)> change,
+                    std::function<void(nl_msg*)> mutate = nullptr) {
     FiraNotificationData data = Result({});
     change(data);
     auto msg = std::make_shared<UniqueNlMsg>();
     EXPECT_TRUE(sim::EncodeFiraNotification(msg->get(), kFamily, data));
+    if (mutate) mutate(msg->get());
     return msg;
   };
+  const int kCall = MCPS802154_ATTR_SCHEDULER_REGION_CALL;
+  const int kParams = MCPS802154_REGION_CALL_ATTR_CALL_PARAMS;
+  const int kData = FIRA_SESSION_NTF_ATTR_RANGING_DATA;
+  auto none = [](FiraNotificationData&) {};
   const struct {
     std::shared_ptr<UniqueNlMsg> msg;
     LogSeverity severity;
@@ -335,14 +315,17 @@ TEST_F(FiraRegionUtilsTest, MessagesThatAreNotResultsAreDroppedWithTheirLine) {
       {encoded([](auto& d) { d.cmd = MCPS802154_CMD_RANGING_REPORT; }), WARNING,
        "GetCallContent: Incorrect command received: 13"},
       // As long as a generic netlink header, but without one.
-      {raw([](nl_msg* m) { nlmsg_hdr(m)->nlmsg_len = NLMSG_HDRLEN + 1; }), ERROR,
+      {encoded(none, [](nl_msg* m) { nlmsg_hdr(m)->nlmsg_len = NLMSG_HDRLEN + 1; }), ERROR,
        "GetCallContent: Message doesn't respect policy"},
-      {raw([](nl_msg* m) { nla_put_u16(m, MCPS802154_ATTR_HW, 1); }), ERROR,
+      {encoded(none, [](nl_msg* m) { Shorten(m, {MCPS802154_ATTR_HW}, 2); }), ERROR,
        "GetCallContent: Message doesn't respect policy"},
       {encoded([](auto& d) { d.hw_index.reset(); }), ERROR,
        "GetCallContent: Missing MCPS802154_ATTR_HW or MCPS802154_ATTR_SCHEDULER_REGION_CALL"},
-      {call([](nl_msg* m) { nla_put_u8(m, MCPS802154_REGION_CALL_ATTR_CALL, 8); }), ERROR,
-       "GetCallContent: Incorrect MCPS802154_ATTR_SCHEDULER_REGION_CALL nested message"},
+      {encoded(none,
+               [&](nl_msg* m) {
+                 Shorten(m, {kCall, MCPS802154_REGION_CALL_ATTR_CALL}, 1);
+               }),
+       ERROR, "GetCallContent: Incorrect MCPS802154_ATTR_SCHEDULER_REGION_CALL nested message"},
       {encoded([](auto& d) { d.region = "ccc"; }), ERROR,
        "GetCallContent: Missing Fira region name in mcps message"},
       {encoded([](auto& d) { d.region.reset(); }), ERROR,
@@ -357,8 +340,11 @@ TEST_F(FiraRegionUtilsTest, MessagesThatAreNotResultsAreDroppedWithTheirLine) {
        "OnRangingResult: No callback for hw index: 4"},
       {encoded([](auto& d) { d.session_id.reset(); }), WARNING,
        "OnRangingResult: Missing session ntf call attrs"},
-      {call([](nl_msg* m) { PutBadlySizedNotification(m, true); }), WARNING,
-       "OnRangingResult: Failed to parse session ntf call attr"},
+      {encoded([](auto& d) { d.index = 1; },
+               [&](nl_msg* m) {
+                 Shorten(m, {kCall, kParams, kData, FIRA_RANGING_DATA_ATTR_INDEX}, 2);
+               }),
+       WARNING, "OnRangingResult: Failed to parse session ntf call attr"},
       {encoded([](auto& d) { d.index.reset(); }), WARNING,
        "OnRangingResult: Missing ranging data attr"},
       {encoded([](auto& d) { d.measurements.reset(); }), WARNING,
@@ -373,7 +359,20 @@ TEST_F(FiraRegionUtilsTest, MessagesThatAreNotResultsAreDroppedWithTheirLine) {
   EXPECT_TRUE(recorder_.stopped.empty());
   // A measurement's address and another's angle of the wrong width drop
   // only themselves.
-  fira_.OnRangingResult(call([](nl_msg* m) { PutBadlySizedNotification(m, false); })->get());
+  auto broken = encoded(
+      [](auto& d) {
+        d.measurements = {{1, false, 0, false, false, 1}, {2, false, 0, false, false, 1}};
+        (*d.measurements)[1].aoa_azimuth = FiraAoaData{1, 1, 1, 1};
+      },
+      [&](nl_msg* m) {
+        const int list = FIRA_RANGING_DATA_ATTR_MEASUREMENTS;
+        Shorten(m, {kCall, kParams, kData, list, 1, FIRA_MEASUREMENT_ATTR_SHORT_ADDR}, 1);
+        Shorten(m,
+                {kCall, kParams, kData, list, 2, FIRA_MEASUREMENT_ATTR_AOA_AZIMUTH,
+                 FIRA_AOA_ATTR_FIRST_ANGLE},
+                1);
+      });
+  fira_.OnRangingResult(broken->get());
   EXPECT_EQ(Logged(ERROR, "ParseMeasurements: Failed to parse ranging measurement"), 1);
   EXPECT_EQ(Logged(ERROR, "ParseAntennaMeasurement: Failed to parse aoa data measurement"), 1);
   ASSERT_EQ(recorder_.results.size(), 1u);

@@ -32,15 +32,13 @@ uwb::UwbAddress Address(uint16_t short_address) {
   return {{static_cast<uint8_t>(short_address >> 8), static_cast<uint8_t>(short_address)}};
 }
 
-// A driver-controller session that asks for every angle: both pairs, raw
-// values, confidence.
+// A driver-controller session with one destination that asks for every
+// angle: both pairs, raw values, confidence.
 uwb::FiraTwrSession AngleSession(int32_t id) {
-  uwb::FiraTwrSession s = ValidFiraSession(id, {kStanding});
-  s.deviceType = uwb::DeviceType(1);
-  s.deviceRole = uwb::DeviceRole(1);
+  uwb::FiraTwrSession s = FullFiraSession(id);
+  s.destAddressList = {Address(kStanding)};
   s.rangingBlockDurationMs = 40;
   s.aoaType = uwb::AoaType(2);
-  s.aoaResultRequest = uwb::AoaResultRequest(1);
   s.resultReportConfig = {true, true, true, true};
   return s;
 }

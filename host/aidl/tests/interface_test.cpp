@@ -28,13 +28,15 @@ class TestUwb : public uwb::BnUwb {
     return ScopedAStatus::ok();
   }
   ScopedAStatus listIfaceNames(std::vector<std::string>* names) override {
-    *names = iface_names;
+    *names = {"uwb0", "\xff"};  // not UTF-8: the reply cannot be written
     return ScopedAStatus::ok();
   }
   ScopedAStatus getIface(const std::string&, std::shared_ptr<uwb::IUwbIface>*) override {
     return ScopedAStatus::ok();
   }
-  ScopedAStatus close() override { return close_status(); }
+  ScopedAStatus close() override {
+    return ScopedAStatus::fromExceptionCodeWithMessage(EX_TRANSACTION_FAILED, "lost on the way");
+  }
   // Refuses, naming what arrived.
   ScopedAStatus loadCalibration(int64_t hw_index, const std::string& path) override {
     const std::string message = std::to_string(hw_index) + ":" + path;
@@ -45,8 +47,6 @@ class TestUwb : public uwb::BnUwb {
     return ScopedAStatus::fromStatus(STATUS_UNKNOWN_ERROR);
   }
 
-  std::vector<std::string> iface_names;
-  ScopedAStatus (*close_status)() = nullptr;
   std::shared_ptr<uwb::IUwbClientCallback> client;
 };
 
@@ -82,6 +82,9 @@ TEST_F(InterfaceTest, ProxiesReturnResultsOnlyOnSuccess) {
   std::vector<int64_t> indices = {7};
   EXPECT_EQ(STATUS_UNKNOWN_ERROR, proxy_->listHardwareIndex(&indices).getStatus());
   EXPECT_EQ(std::vector<int64_t>{7}, indices) << "out-value written on failure";
+  std::vector<std::string> names = {"kept"};
+  EXPECT_EQ(STATUS_BAD_VALUE, proxy_->listIfaceNames(&names).getStatus());
+  EXPECT_EQ(std::vector<std::string>{"kept"}, names);
 
   // An interface passed along reaches the other side as a proxy to the same
   // binder, not as the object itself.
@@ -113,26 +116,8 @@ TEST_F(InterfaceTest, CallsFailAsTheyWouldCrossingAProcessBoundary) {
     EXPECT_EQ(refused_with, status.getStatus());
     EXPECT_EQ(refused_with == STATUS_OK ? "-5:" + path : "", status.getMessage());
   }
-
-  // Answers of close() as the caller sees them: a failed transaction loses
-  // its message.
-  const std::pair<ScopedAStatus (*)(), std::string> answers[] = {
-      {[] { return ScopedAStatus::fromServiceSpecificErrorWithMessage(1, "Netlink failure"); },
-       "Status(-8, EX_SERVICE_SPECIFIC): '1: Netlink failure'"},
-      {[] { return ScopedAStatus::fromExceptionCodeWithMessage(EX_TRANSACTION_FAILED, "x"); },
-       "Status(-129, EX_TRANSACTION_FAILED): 'FAILED_TRANSACTION: '"},
-      {[] { return ScopedAStatus::fromStatus(STATUS_NO_MEMORY); },
-       "Status(-129, EX_TRANSACTION_FAILED): 'NO_MEMORY: '"},
-  };
-  for (const auto& [answer, seen] : answers) {
-    service_->close_status = answer;
-    EXPECT_EQ(seen, proxy_->close().getDescription());
-  }
-
-  service_->iface_names = {"uwb0", "\xff"};
-  std::vector<std::string> names = {"kept"};
-  EXPECT_EQ(STATUS_BAD_VALUE, proxy_->listIfaceNames(&names).getStatus()) << "unwritable reply";
-  EXPECT_EQ(std::vector<std::string>{"kept"}, names);
+  EXPECT_EQ("Status(-129, EX_TRANSACTION_FAILED): 'FAILED_TRANSACTION: '",
+            proxy_->close().getDescription());
 }
 
 // What the device maker installs declares exactly the instance the service

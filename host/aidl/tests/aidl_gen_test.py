@@ -5,6 +5,7 @@ import glob
 import io
 import os
 import pathlib
+import re
 import shutil
 import subprocess
 import sys
@@ -22,30 +23,24 @@ SOURCE_DIR = os.environ.get('DALIX_SOURCE_DIR', os.path.join(HERE, '..', '..', '
 PACKAGE_DIR = os.path.join(SOURCE_DIR, 'aidl', 'aidl', 'hardware', 'dalix', 'uwb')
 API_DIR = os.path.join(SOURCE_DIR, 'aidl', 'aidl_api', 'aidl.hardware.dalix.uwb')
 SOURCES = sorted(glob.glob(os.path.join(PACKAGE_DIR, '*.aidl')))
+IMPORT = 'import aidl.hardware.dalix.uwb.'
 
-# (file, what follows its package line, line of the error, reason).
+# (what follows the package line, line of the error, reason). Each file is
+# named after the type it declares.
 REFUSALS = [
-    ('IOneway', 'interface IOneway {\n    oneway void f();\n}\n', 4,
-     'oneway methods are not supported'),
-    ('Big', '@Backing(type="byte")\nenum Big {\n    A = 127,\n    B,\n}\n', 6,
-     'does not fit the byte backing'),
-    ('Holder', 'parcelable Holder {\n\n    Map<String, String> m;\n}\n', 5,
-     'type Map is not supported by the NDK back end'),
-    ('Unimported', 'parcelable Unimported {\n    Other o;\n}\n', 4, "Failed to resolve 'Other'"),
-    ('Unknown', 'parcelable Unknown {\n    aidl.hardware.dalix.uwb.Nowhere n;\n}\n', 4,
-     "Failed to resolve 'Nowhere'"),
-    ('Foreign', 'parcelable Foreign {\n    android.os.Thing t;\n}\n', 4,
-     "Failed to resolve 'android.os.Thing'"),
-    ('IInout', 'interface IInout {\n    void f(inout int x);\n}\n', 4,
-     "'int x' can be an in parameter only"),
-    ('ITwice', 'interface ITwice {\n    void f(int x, long x);\n}\n', 4,
-     "method 'f' has duplicate argument name 'x'"),
-    ('IBad', 'interface IBad {\n    union x;\n}\n', 4,
-     'nested "union" declarations are not supported'),
-    ('Lonely', 'import aidl.hardware.dalix.uwb.Missing;\n@VintfStability\nparcelable Lonely {\n}\n',
-     2, "Couldn't find import for class aidl.hardware.dalix.uwb.Missing"),
-    ('Twice', 'import aidl.hardware.dalix.uwb.Other;\nimport aidl.hardware.dalix.uwb.Other;\n',
-     3, 'import aidl.hardware.dalix.uwb.Other is duplicated'),
+    ('interface IOneway {\noneway void f();\n}\n', 4, 'oneway methods are not supported'),
+    ('@Backing(type="byte")\nenum Big {\nA = 127,\nB,\n}\n', 6, 'does not fit the byte backing'),
+    ('parcelable Holder {\n\nMap<String, String> m;\n}\n', 5, 'type Map is not supported by'),
+    ('parcelable Unimported {\nOther o;\n}\n', 4, "Failed to resolve 'Other'"),
+    ('parcelable Unknown {\naidl.hardware.dalix.uwb.Nowhere n;\n}\n', 4, "resolve 'Nowhere'"),
+    ('parcelable Foreign {\nandroid.os.Thing t;\n}\n', 4, "resolve 'android.os.Thing'"),
+    ('interface IInout {\nvoid f(inout int x);\n}\n', 4, "'int x' can be an in parameter only"),
+    ('interface ITwice {\nvoid f(int x, long x);\n}\n', 4, "'f' has duplicate argument name 'x'"),
+    ('interface IBad {\nunion x;\n}\n', 4, 'nested "union" declarations are not supported'),
+    (IMPORT + 'Missing;\n@VintfStability\nparcelable Lonely {\n}\n', 2,
+     "Couldn't find import for class aidl.hardware.dalix.uwb.Missing"),
+    (IMPORT + 'Other;\n' + IMPORT + 'Other;\nparcelable Twice {\n}\n', 3,
+     'import aidl.hardware.dalix.uwb.Other is duplicated'),
 ]
 
 
@@ -75,18 +70,18 @@ class GeneratorTest(unittest.TestCase):
         self.dir = tempfile.mkdtemp()
         self.addCleanup(shutil.rmtree, self.dir)
 
-    def write(self, name, text):
+    def write(self, text):
         """|text| follows the package line, and @VintfStability unless it imports."""
-        path = os.path.join(self.dir, name + '.aidl')
+        path = os.path.join(self.dir, re.search(r'(\w+) {', text).group(1) + '.aidl')
         stability = '' if text.startswith('import') else '@VintfStability\n'
         pathlib.Path(path).write_text('package aidl.hardware.dalix.uwb;\n' + stability + text)
         return path
 
     def test_refusals_name_file_line_and_reason(self):
-        other = self.write('Other', 'parcelable Other {\n    int x;\n}\n')
-        for name, text, line, reason in REFUSALS:
-            with self.subTest(name):
-                path = self.write(name, text)
+        other = self.write('parcelable Other {\n    int x;\n}\n')
+        for text, line, reason in REFUSALS:
+            with self.subTest(text):
+                path = self.write(text)
                 status, out, err = generator('outputs', '--out', self.dir, path, other)
                 self.assertEqual((1, ''), (status, out))
                 self.assertTrue(err.startswith('aidl_gen: error: %s:%d: ' % (path, line)), err)

@@ -1,19 +1,22 @@
 #include <cstring>
+#include <fstream>
 #include <memory>
 #include <optional>
 #include <string>
+#include <type_traits>
 #include <utility>
 #include <vector>
 
-#include <aidl/aidl/hardware/dalix/uwb/BnUwb.h>
-#include <aidl/aidl/hardware/dalix/uwb/BnUwbClientCallback.h>
 #include <aidl/aidl/hardware/dalix/uwb/BpUwb.h>
+#include <android/binder_enums.h>
 #include <android/binder_manager.h>
 #include <android/binder_process.h>
 #include <binder_host/host.h>
 #include <binder_host/parcel_check.h>
+#include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include "uwb_aidl.h"
 #include "vintf_manifest.h"
 
 namespace {
@@ -21,10 +24,63 @@ namespace {
 namespace uwb = ::aidl::aidl::hardware::dalix::uwb;
 using ndk::ScopedAStatus;
 
+// What the platform's back end makes of the package, checked at build time.
+static_assert(std::is_same_v<std::underlying_type_t<uwb::AoaType>, int8_t>);
+static_assert(uwb::IFiraController::TRANSACTION_reset == FIRST_CALL_TRANSACTION + 14);
+
+// The forms the service's session log line is made of: every field in
+// declaration order, enumerations by name, bytes signed, byte arrays unsigned,
+// nested parcelables and lists. The service's refusals print unnamed values.
+TEST(GeneratedTypesTest, EnumerationsAndParcelablesPrintAndCompareFieldByField) {
+  std::vector<std::string> names;
+  for (uwb::RframeConfig value : ndk::enum_range<uwb::RframeConfig>()) {
+    names.push_back(toString(value));
+  }
+  EXPECT_EQ((std::vector<std::string>{"SPO", "SP1", "SP3"}), names);
+  const uwb::RangingRoundControl control{true, uwb::MeasurementReportType::RESPONDER_TO_INITIATOR};
+  EXPECT_EQ(
+      "RangingRoundControl{hasResultReportPhase: true, "
+      "measurementReportType: RESPONDER_TO_INITIATOR, hasDeferredMode: false}",
+      control.toString());
+
+  uwb::FiraTwrMeasurement a, b{uwb::UwbAddress{{0x12, 0xff}}, -5, 0, 300, -1, {{}}};
+  EXPECT_EQ(
+      "FiraTwrMeasurement{address: UwbAddress{address: [18, 255]}, timestampNs: -5, status: 0, "
+      "distance: 300, lineOfSight: -1, antennaMeasurements: [FiraAntennaMeasurement{kind: 0, "
+      "firstAngleRad: 0.000000, figureOfMerit: 0.000000, secondAngleRad: 0.000000}], "
+      "azimuthRad: 0.000000, azimuthFigureOfMerit: 0.000000, elevationRad: 0.000000, "
+      "elevationFigureOfMerit: 0.000000}",
+      b.toString());
+  EXPECT_EQ(a, uwb::FiraTwrMeasurement{});
+  b.antennaMeasurements.clear();
+  EXPECT_NE(a, b);
+}
+
+// The descriptor names the package; the hash is the one recorded at freezing.
+template <typename... Interfaces>
+void ExpectFrozenIdentity(const std::string& hash) {
+  (..., [&] {
+    static_assert(Interfaces::version == 1);
+    EXPECT_THAT(Interfaces::descriptor,
+                testing::MatchesRegex("aidl\\.hardware\\.dalix\\.uwb\\.I[A-Za-z]+"));
+    EXPECT_EQ(hash, Interfaces::hash) << Interfaces::descriptor;
+  }());
+}
+
+TEST(GeneratedTypesTest, InterfacesCarryTheFrozenVersionAndHash) {
+  std::ifstream file(DALIX_AIDL_HASH_FILE);
+  std::string recorded;
+  file >> recorded;
+  ASSERT_EQ(40u, recorded.size());
+  ExpectFrozenIdentity<uwb::IUwb, uwb::IUwbIface, uwb::IFiraController, uwb::ICccController,
+                       uwb::ISimpleRangingController, uwb::IUwbClientCallback,
+                       uwb::IFiraStateCallback, uwb::IFiraSessionCallback,
+                       uwb::ISimpleRangingCallback>(recorded);
+}
+
 class TestUwb : public uwb::BnUwb {
  public:
-  ScopedAStatus open(const std::shared_ptr<uwb::IUwbClientCallback>& callback) override {
-    client = callback;
+  ScopedAStatus open(const std::shared_ptr<uwb::IUwbClientCallback>&) override {
     return ScopedAStatus::ok();
   }
   ScopedAStatus listIfaceNames(std::vector<std::string>* names) override {
@@ -46,11 +102,7 @@ class TestUwb : public uwb::BnUwb {
     *indices = {42};  // written on failure on purpose: the caller must not see it
     return ScopedAStatus::fromStatus(STATUS_UNKNOWN_ERROR);
   }
-
-  std::shared_ptr<uwb::IUwbClientCallback> client;
 };
-
-class ClientCallback : public uwb::BnUwbClientCallback {};
 
 // Client and service share this thread, the one that set up polling, so
 // calls run at once; they pass the same boundary checks as from any other
@@ -72,30 +124,19 @@ class InterfaceTest : public ::testing::Test {
   std::shared_ptr<uwb::IUwb> proxy_;
 };
 
-TEST_F(InterfaceTest, ProxiesReturnResultsOnlyOnSuccess) {
+// What a real process boundary refuses or strips, the emulated one does too;
+// a failed call leaves the caller's out-values as they were.
+TEST_F(InterfaceTest, CallsFailAsTheyWouldCrossingAProcessBoundary) {
   EXPECT_EQ(nullptr, uwb::IUwbIface::fromBinder(service_->asBinder()));
-  int32_t version = 0;
-  std::string hash;
-  EXPECT_TRUE(proxy_->getInterfaceVersion(&version).isOk());
-  EXPECT_TRUE(proxy_->getInterfaceHash(&hash).isOk());
-  EXPECT_EQ(std::make_pair(1, std::string(uwb::IUwb::hash)), std::make_pair(version, hash));
   std::vector<int64_t> indices = {7};
   EXPECT_EQ(STATUS_UNKNOWN_ERROR, proxy_->listHardwareIndex(&indices).getStatus());
-  EXPECT_EQ(std::vector<int64_t>{7}, indices) << "out-value written on failure";
+  EXPECT_EQ(std::vector<int64_t>{7}, indices);
   std::vector<std::string> names = {"kept"};
   EXPECT_EQ(STATUS_BAD_VALUE, proxy_->listIfaceNames(&names).getStatus());
   EXPECT_EQ(std::vector<std::string>{"kept"}, names);
+  EXPECT_EQ("Status(-129, EX_TRANSACTION_FAILED): 'FAILED_TRANSACTION: '",
+            proxy_->close().getDescription());
 
-  // An interface passed along reaches the other side as a proxy to the same
-  // binder, not as the object itself.
-  auto callback = ndk::SharedRefBase::make<ClientCallback>();
-  ASSERT_TRUE(proxy_->open(callback).isOk());
-  EXPECT_NE(std::static_pointer_cast<uwb::IUwbClientCallback>(callback), service_->client);
-  EXPECT_EQ(callback->asBinder(), service_->client->asBinder());
-}
-
-// What a real process boundary refuses or strips, the emulated one does too.
-TEST_F(InterfaceTest, CallsFailAsTheyWouldCrossingAProcessBoundary) {
   // Request: token header, descriptor, int64, then the path's length, its
   // UTF-16 characters and terminator.
   const size_t fixed = 12 + 4 + (std::strlen(uwb::IUwb::descriptor) + 1) * 2 + 8 + 4 + 2;
@@ -116,13 +157,10 @@ TEST_F(InterfaceTest, CallsFailAsTheyWouldCrossingAProcessBoundary) {
     EXPECT_EQ(refused_with, status.getStatus());
     EXPECT_EQ(refused_with == STATUS_OK ? "-5:" + path : "", status.getMessage());
   }
-  EXPECT_EQ("Status(-129, EX_TRANSACTION_FAILED): 'FAILED_TRANSACTION: '",
-            proxy_->close().getDescription());
 }
 
-// What the device maker installs declares exactly the instance the service
-// registers, at the version the library was frozen at; the registry, as the
-// device's, takes no name the fragment does not declare.
+// The registry, as the device's, takes only what the fragment declares: the
+// service's instance, at the version the library was frozen at.
 TEST_F(InterfaceTest, OnlyTheFragmentsInstanceRegistersAtTheFrozenVersion) {
   std::string error;
   std::optional<ndk::host::VintfManifest> manifest =
@@ -131,13 +169,10 @@ TEST_F(InterfaceTest, OnlyTheFragmentsInstanceRegistersAtTheFrozenVersion) {
   ASSERT_EQ(1u, manifest->instances().size());
   const int32_t frozen_version = uwb::IUwb::version;  // a copy: the constant has no definition
   EXPECT_EQ(frozen_version, manifest->instances().front().version);
-  for (const std::string& name :
-       {instance_ + "2", "x" + instance_, std::string(uwb::IUwb::descriptor)}) {
-    EXPECT_EQ(EX_ILLEGAL_ARGUMENT,
-              AServiceManager_addService(service_->asBinder().get(), name.c_str()))
-        << name;
-    EXPECT_EQ(nullptr, AServiceManager_checkService(name.c_str())) << name;
-  }
+  const std::string other = instance_ + "2";
+  EXPECT_EQ(EX_ILLEGAL_ARGUMENT,
+            AServiceManager_addService(service_->asBinder().get(), other.c_str()));
+  EXPECT_EQ(nullptr, AServiceManager_checkService(other.c_str()));
 }
 
 }  // namespace

@@ -1,18 +1,25 @@
 #include <poll.h>
 
 #include <atomic>
+#include <cerrno>
+#include <cstdint>
 #include <memory>
+#include <string>
 #include <thread>
+#include <utility>
 #include <vector>
 
 #include <android/binder_auto_utils.h>
 #include <android/binder_ibinder.h>
 #include <android/binder_interface_utils.h>
 #include <android/binder_process.h>
+#include <android/binder_status.h>
 #include <binder_host/host.h>
 #include <gtest/gtest.h>
 
 namespace {
+
+using ndk::ScopedAStatus;
 
 class IThing : public ndk::ICInterface {};
 
@@ -59,80 +66,66 @@ class BinderProcessTest : public ::testing::Test {
   ndk::ScopedAIBinder_DeathRecipient recipient_{AIBinder_DeathRecipient_new(OnDeath)};
 };
 
-TEST_F(BinderProcessTest, ClientCallsWaitForThePollingThreadAndRunThereOneAtATime) {
+// Calls from other threads wait for a thread that handles the polled
+// commands and run there one at a time; the calls they make in turn run at
+// once instead of queueing behind themselves.
+TEST_F(BinderProcessTest, ClientCallsWaitForAHandlingThreadAndRunThereOneAtATime) {
   constexpr int kClients = 4, kCallsEach = 50;
-  std::vector<std::thread::id> ran_on;  // only the calls touch it, and they run on this thread
+  std::vector<std::thread::id> ran_on;  // only the calls touch it, and one at a time
   std::atomic<int> finished{0};
   std::vector<std::thread> clients(kClients);
   for (std::thread& client : clients) {
     client = std::thread([&] {
       for (int n = 0; n < kCallsEach; ++n) {
-        EXPECT_EQ(STATUS_OK, ndk::host::Transact(
-                                 binder_, [&] { ran_on.push_back(std::this_thread::get_id()); }));
+        EXPECT_EQ(STATUS_OK, ndk::host::Transact(binder_, [&] {
+                    ndk::host::Transact(binder_,
+                                        [&] { ran_on.push_back(std::this_thread::get_id()); });
+                  }));
       }
       ++finished;
     });
   }
   ASSERT_TRUE(Readable(fd_));
   EXPECT_TRUE(ran_on.empty()) << "a call ran before the commands were handled";
-  while (finished < kClients) {
-    if (Readable(fd_, 20)) ABinderProcess_handlePolledCommands();
-  }
+  std::thread handler([&] {
+    while (finished < kClients) {
+      if (Readable(fd_, 20)) ABinderProcess_handlePolledCommands();
+    }
+  });
+  const std::thread::id handler_id = handler.get_id();
+  handler.join();
   for (std::thread& client : clients) client.join();
-  EXPECT_EQ(std::vector(kClients * kCallsEach, std::this_thread::get_id()), ran_on);
-  ABinderProcess_handlePolledCommands();
+  EXPECT_EQ(std::vector(kClients * kCallsEach, handler_id), ran_on);
   EXPECT_FALSE(Readable(fd_, 0)) << "handling leaves the descriptor signalled";
 }
 
-// Handled on a thread other than the one that set up polling, the calls a
-// handler makes must not queue behind the handler itself.
-TEST_F(BinderProcessTest, CallsFromAHandlingThreadRunAtOnce) {
-  int runs = 0;
-  std::thread client([&] {
-    ndk::host::Transact(binder_, [&] { ndk::host::Transact(binder_, [&] { ++runs; }); });
-  });
-  ASSERT_TRUE(Readable(fd_));
-  std::thread([] { ABinderProcess_handlePolledCommands(); }).join();
-  client.join();
-  EXPECT_EQ(1, runs);
-}
-
-TEST_F(BinderProcessTest, KilledBinderNotifiesEachLinkOnceOnThePollingThread) {
+// Links on a recipient of their own are never notified once it is deleted:
+// before the death, while the notice is queued, or from its own callback.
+TEST_F(BinderProcessTest, KilledBinderNotifiesEachLiveLinkOnceOnThePollingThread) {
   Link first{recipient_.get()}, second{recipient_.get()}, unlinked{recipient_.get()};
-  for (Link* link : {&first, &second, &unlinked}) {
-    ASSERT_EQ(STATUS_OK, AIBinder_linkToDeath(binder_, recipient_.get(), link));
+  Link before{AIBinder_DeathRecipient_new(OnDeath)}, queued{AIBinder_DeathRecipient_new(OnDeath)};
+  Link in_callback{AIBinder_DeathRecipient_new(OnDeath), true};
+  for (Link* link : {&first, &second, &unlinked, &before, &queued, &in_callback}) {
+    ASSERT_EQ(STATUS_OK, AIBinder_linkToDeath(binder_, link->recipient, link));
   }
   EXPECT_EQ(STATUS_OK, AIBinder_unlinkToDeath(binder_, recipient_.get(), &unlinked));
   EXPECT_EQ(STATUS_NAME_NOT_FOUND, AIBinder_unlinkToDeath(binder_, recipient_.get(), &unlinked));
-  EXPECT_TRUE(AIBinder_isAlive(binder_));
+  AIBinder_DeathRecipient_delete(before.recipient);
 
   std::thread([this] { ndk::host::KillBinder(binder_); }).join();
   EXPECT_FALSE(AIBinder_isAlive(thing_->asBinder().get()));
-  EXPECT_EQ(STATUS_DEAD_OBJECT, AIBinder_ping(binder_));
   EXPECT_EQ(0, first.calls) << "delivered before this thread handled the commands";
+  AIBinder_DeathRecipient_delete(queued.recipient);
   ASSERT_TRUE(Readable(fd_));
   ABinderProcess_handlePolledCommands();
   ndk::host::KillBinder(binder_);
   ABinderProcess_handlePolledCommands();
 
-  EXPECT_EQ((std::vector{1, 1, 0}), (std::vector{first.calls, second.calls, unlinked.calls}));
+  EXPECT_EQ((std::vector{1, 1, 0, 0, 0, 1}),
+            (std::vector{first.calls, second.calls, unlinked.calls, before.calls, queued.calls,
+                         in_callback.calls}));
   EXPECT_EQ(STATUS_DEAD_OBJECT, AIBinder_linkToDeath(binder_, recipient_.get(), &first));
   EXPECT_EQ(STATUS_DEAD_OBJECT, ndk::host::Transact(binder_, [] {}));
-}
-
-TEST_F(BinderProcessTest, DeletedRecipientIsNeverCalledAndMayDeleteItself) {
-  enum When { kBeforeDeath, kWhileQueued, kInItsCallback };
-  for (When when : {kBeforeDeath, kWhileQueued, kInItsCallback}) {
-    SCOPED_TRACE(when);
-    ndk::SpAIBinder binder = ndk::SharedRefBase::make<Thing>()->asBinder();
-    Link link{AIBinder_DeathRecipient_new(OnDeath), when == kInItsCallback};
-    ASSERT_EQ(STATUS_OK, AIBinder_linkToDeath(binder.get(), link.recipient, &link));
-    if (when == kBeforeDeath) AIBinder_DeathRecipient_delete(link.recipient);
-    ndk::host::KillBinder(binder.get());
-    if (when == kWhileQueued) AIBinder_DeathRecipient_delete(link.recipient);
-    ABinderProcess_handlePolledCommands();
-    EXPECT_EQ(when == kInItsCallback ? 1 : 0, link.calls);
-  }
 }
 
 TEST_F(BinderProcessTest, BinderKeepsItsObject) {
@@ -142,20 +135,53 @@ TEST_F(BinderProcessTest, BinderKeepsItsObject) {
   EXPECT_EQ(1, AIBinder_debugGetRefCount(binder.get()));
   thing_.reset();
   EXPECT_FALSE(watch.expired());
-  ndk::ScopedAIBinder_Weak weak(AIBinder_Weak_new(binder.get()));
-  EXPECT_EQ(binder, weak.promote());
   binder.set(nullptr);
   EXPECT_TRUE(watch.expired());
-  EXPECT_EQ(nullptr, weak.promote().get());
 }
 
-// make() is the only owner the device tolerates; anything else aborts here
-// at the first ref() or at destruction instead of being owned twice there.
-TEST(SharedRefBaseDeathTest, ObjectsNotMadeByMakeAbort) {
+// The descriptions are the platform's own texts, which clients and bug
+// reports show; each names every part of its status, with the platform's
+// numbers, which clients compare.
+TEST(StatusTest, EachConstructorDescribesItsParts) {
+  static_assert(STATUS_UNKNOWN_ERROR == INT32_MIN && STATUS_FAILED_TRANSACTION == INT32_MIN + 2 &&
+                STATUS_DEAD_OBJECT == -EPIPE);
+  const std::pair<ScopedAStatus, std::string> cases[] = {
+      {ScopedAStatus::ok(), "No error"},
+      {ScopedAStatus::fromStatus(STATUS_OK), "No error"},
+      {ScopedAStatus::fromExceptionCodeWithMessage(EX_ILLEGAL_ARGUMENT, "bad"),
+       "Status(-3, EX_ILLEGAL_ARGUMENT): 'bad'"},
+      {ScopedAStatus::fromExceptionCode(EX_ILLEGAL_STATE), "Status(-5, EX_ILLEGAL_STATE): ''"},
+      {ScopedAStatus::fromExceptionCodeWithMessage(EX_UNSUPPORTED_OPERATION, nullptr),
+       "Status(-7, EX_UNSUPPORTED_OPERATION): ''"},
+      {ScopedAStatus::fromExceptionCode(EX_TRANSACTION_FAILED),
+       "Status(-129, EX_TRANSACTION_FAILED): 'FAILED_TRANSACTION: '"},
+      {ScopedAStatus::fromExceptionCode(-42), "Status(-42, -42): ''"},
+      {ScopedAStatus::fromStatus(-EIO),
+       "Status(-129, EX_TRANSACTION_FAILED): '-5 (Input/output error): '"},
+      {ScopedAStatus::fromServiceSpecificError(-7), "Status(-8, EX_SERVICE_SPECIFIC): '-7: '"},
+  };
+  for (const auto& [status, description] : cases) {
+    EXPECT_EQ(description, status.getDescription());
+    EXPECT_EQ(description == "No error", status.isOk()) << description;
+  }
+}
+
+// What crashes on the device aborts here, naming the misuse: an object owned
+// other than through make() (owned twice there) and reading any part of an
+// empty status but isOk().
+TEST(MisuseDeathTest, AbortsNamingTheMisuse) {
   GTEST_FLAG_SET(death_test_style, "threadsafe");
   EXPECT_DEATH(std::make_shared<Thing>(), "not created by SharedRefBase::make\\(\\) was destroyed");
   EXPECT_DEATH({ Thing on_stack; }, "was destroyed");
   EXPECT_DEATH((void)std::make_shared<Thing>()->asBinder(), "was asked for ref\\(\\)");
+  ScopedAStatus held = ScopedAStatus::fromServiceSpecificError(1);
+  ScopedAStatus taken = std::move(held);
+  EXPECT_FALSE(held.isOk());  // NOLINT(bugprone-use-after-move): the point of the test
+  EXPECT_DEATH((void)held.getExceptionCode(), "AStatus_getExceptionCode: the status is empty");
+  EXPECT_DEATH((void)held.getServiceSpecificError(), "AStatus_getServiceSpecificError: ");
+  EXPECT_DEATH((void)held.getStatus(), "AStatus_getStatus: ");
+  EXPECT_DEATH((void)held.getMessage(), "AStatus_getMessage: ");
+  EXPECT_DEATH((void)ScopedAStatus().getDescription(), "AStatus_getDescription: ");
 }
 
 }  // namespace

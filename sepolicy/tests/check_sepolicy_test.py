@@ -38,7 +38,3 @@ class CheckSepolicyTest(unittest.TestCase):
                                         capture_output=True, text=True)
                 self.assertEqual(1, result.returncode, result.stdout)
                 self.assertIn(expected, result.stdout)
-
-
-if __name__ == '__main__':
-    unittest.main()

@@ -1,8 +1,5 @@
 """Tests of the interface library generator and of the frozen API."""
 
-import contextlib
-import glob
-import io
 import os
 import pathlib
 import re
@@ -22,7 +19,7 @@ from aidl_parser import parse_package  # noqa: E402
 SOURCE_DIR = os.environ.get('DALIX_SOURCE_DIR', os.path.join(HERE, '..', '..', '..'))
 PACKAGE_DIR = os.path.join(SOURCE_DIR, 'aidl', 'aidl', 'hardware', 'dalix', 'uwb')
 API_DIR = os.path.join(SOURCE_DIR, 'aidl', 'aidl_api', 'aidl.hardware.dalix.uwb')
-SOURCES = sorted(glob.glob(os.path.join(PACKAGE_DIR, '*.aidl')))
+SOURCES = sorted(str(p) for p in pathlib.Path(PACKAGE_DIR).glob('*.aidl'))
 IMPORT = 'import aidl.hardware.dalix.uwb.'
 
 # (what follows the package line, line of the error, reason). Each file is
@@ -46,10 +43,9 @@ REFUSALS = [
 
 def generator(*args):
     """Runs the generator's command line; its status and what it printed."""
-    out, err = io.StringIO(), io.StringIO()
-    with contextlib.redirect_stdout(out), contextlib.redirect_stderr(err):
-        status = aidl_gen.main(list(args))
-    return status, out.getvalue(), err.getvalue()
+    run = subprocess.run([sys.executable, '-B', aidl_gen.__file__, *args], capture_output=True,
+                         text=True)
+    return run.returncode, run.stdout, run.stderr
 
 
 def hash_recipe(frozen, previous):
@@ -67,8 +63,7 @@ def read_tree(root):
 
 class GeneratorTest(unittest.TestCase):
     def setUp(self):
-        self.dir = tempfile.mkdtemp()
-        self.addCleanup(shutil.rmtree, self.dir)
+        self.dir = self.enterContext(tempfile.TemporaryDirectory())
 
     def write(self, text):
         """|text| follows the package line, and @VintfStability unless it imports."""
@@ -112,6 +107,3 @@ class GeneratorTest(unittest.TestCase):
             status, _, err = generator(*args, '--api-dir', api, *SOURCES)
             self.assertEqual(1, status)
             self.assertIn(reason, err)
-
-if __name__ == '__main__':
-    unittest.main()

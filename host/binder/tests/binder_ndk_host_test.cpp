@@ -3,7 +3,10 @@
 #include <atomic>
 #include <cerrno>
 #include <cstdint>
+#include <cstdio>
+#include <fstream>
 #include <memory>
+#include <optional>
 #include <string>
 #include <thread>
 #include <utility>
@@ -16,6 +19,8 @@
 #include <android/binder_status.h>
 #include <binder_host/host.h>
 #include <gtest/gtest.h>
+
+#include "vintf_manifest.h"
 
 namespace {
 
@@ -146,13 +151,11 @@ TEST(StatusTest, EachConstructorDescribesItsParts) {
   static_assert(STATUS_UNKNOWN_ERROR == INT32_MIN && STATUS_FAILED_TRANSACTION == INT32_MIN + 2 &&
                 STATUS_DEAD_OBJECT == -EPIPE);
   const std::pair<ScopedAStatus, std::string> cases[] = {
-      {ScopedAStatus::ok(), "No error"},
       {ScopedAStatus::fromStatus(STATUS_OK), "No error"},
       {ScopedAStatus::fromExceptionCodeWithMessage(EX_ILLEGAL_ARGUMENT, "bad"),
        "Status(-3, EX_ILLEGAL_ARGUMENT): 'bad'"},
-      {ScopedAStatus::fromExceptionCode(EX_ILLEGAL_STATE), "Status(-5, EX_ILLEGAL_STATE): ''"},
-      {ScopedAStatus::fromExceptionCodeWithMessage(EX_UNSUPPORTED_OPERATION, nullptr),
-       "Status(-7, EX_UNSUPPORTED_OPERATION): ''"},
+      {ScopedAStatus::fromExceptionCodeWithMessage(EX_ILLEGAL_STATE, nullptr),
+       "Status(-5, EX_ILLEGAL_STATE): ''"},
       {ScopedAStatus::fromExceptionCode(EX_TRANSACTION_FAILED),
        "Status(-129, EX_TRANSACTION_FAILED): 'FAILED_TRANSACTION: '"},
       {ScopedAStatus::fromExceptionCode(-42), "Status(-42, -42): ''"},
@@ -182,6 +185,52 @@ TEST(MisuseDeathTest, AbortsNamingTheMisuse) {
   EXPECT_DEATH((void)held.getStatus(), "AStatus_getStatus: ");
   EXPECT_DEATH((void)held.getMessage(), "AStatus_getMessage: ");
   EXPECT_DEATH((void)ScopedAStatus().getDescription(), "AStatus_getDescription: ");
+}
+
+// An AIDL entry of package a.b with |body| inside.
+std::string Aidl(const std::string& body) {
+  return "<manifest><hal format='aidl'><name>a.b</name>" + body + "</hal></manifest>";
+}
+
+TEST(VintfManifestTest, DeclaresTheAidlInstancesOfAWellFormedManifestOnly) {
+  const struct {
+    std::string xml;
+    const char* declared = nullptr;      // declared, at |version|, as the first instance
+    const char* not_declared = nullptr;  // not declared; null: the manifest must not load
+    int version = 0;
+  } cases[] = {
+      {Aidl("<version>2</version><fqname>IFoo/default</fqname>"), "a.b.IFoo/default",
+       "a.b.IFoo/default2", 2},
+      {Aidl("<interface><name>IFoo</name><instance>x</instance><instance>y</instance></interface>"),
+       "a.b.IFoo/x", "a.c.IFoo/y", 1},
+      {"<manifest><hal format='hidl'><name>a.b</name><fqname>@1.0::IFoo/default</fqname></hal>"
+       "</manifest>",
+       nullptr, "a.b.IFoo/default"},
+      {"<manifest><hal format='aidl'><name>a.b</name></manifest>"},  // not well-formed
+      {"<compatibility-matrix/>"},
+      {Aidl("<version>1x</version><fqname>IFoo/default</fqname>")},
+      {Aidl("<version>0</version><fqname>IFoo/default</fqname>")},
+      {Aidl("<fqname>IFoo/</fqname>")},
+      {Aidl("")},
+  };
+  const std::string path = ::testing::TempDir() + "vintf_manifest_test.xml";
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.xml);
+    std::ofstream(path) << c.xml;
+    std::string error;
+    std::optional<ndk::host::VintfManifest> manifest = ndk::host::VintfManifest::Load(path, &error);
+    ASSERT_EQ(c.not_declared != nullptr, manifest.has_value()) << error;
+    if (!manifest.has_value()) {
+      EXPECT_NE(std::string::npos, error.find(path)) << error;
+      continue;
+    }
+    EXPECT_FALSE(manifest->Declares(c.not_declared));
+    if (c.declared == nullptr) continue;
+    EXPECT_TRUE(manifest->Declares(c.declared));
+    EXPECT_EQ(c.declared, manifest->instances().front().Name());
+    EXPECT_EQ(c.version, manifest->instances().front().version);
+  }
+  std::remove(path.c_str());
 }
 
 }  // namespace

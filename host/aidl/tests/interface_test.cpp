@@ -7,7 +7,6 @@
 #include <utility>
 #include <vector>
 
-#include <aidl/aidl/hardware/dalix/uwb/BpUwb.h>
 #include <android/binder_manager.h>
 #include <android/binder_process.h>
 #include <binder_host/host.h>
@@ -26,10 +25,8 @@ using ndk::ScopedAStatus;
 static_assert(std::is_same_v<std::underlying_type_t<uwb::AoaType>, int8_t>);
 static_assert(uwb::IFiraController::TRANSACTION_reset == FIRST_CALL_TRANSACTION + 14);
 
-// The forms the service's session log line is made of: every field in
-// declaration order, enumerations by name, booleans, bytes signed, byte
-// arrays unsigned, nested parcelables. The service's refusals print unnamed
-// enumeration values.
+// Every field in declaration order, enumerations by name, byte arrays unsigned:
+// the forms of the service's session log line (its refusals print unnamed values).
 TEST(GeneratedTypesTest, ParcelablesPrintAndCompareFieldByField) {
   const uwb::RangingRoundControl control{true, uwb::MeasurementReportType::RESPONDER_TO_INITIATOR,
                                          false};
@@ -37,17 +34,9 @@ TEST(GeneratedTypesTest, ParcelablesPrintAndCompareFieldByField) {
       "RangingRoundControl{hasResultReportPhase: true, "
       "measurementReportType: RESPONDER_TO_INITIATOR, hasDeferredMode: false}",
       control.toString());
-
-  uwb::FiraTwrMeasurement a, b;
-  b.address.address = {0x12, 0xff};
-  b.lineOfSight = -1;
-  EXPECT_EQ(
-      "FiraTwrMeasurement{address: UwbAddress{address: [18, 255]}, timestampNs: 0, status: 0, "
-      "distance: 0, lineOfSight: -1, antennaMeasurements: [], azimuthRad: 0.000000, "
-      "azimuthFigureOfMerit: 0.000000, elevationRad: 0.000000, elevationFigureOfMerit: 0.000000}",
-      b.toString());
-  EXPECT_EQ(a, uwb::FiraTwrMeasurement{});
-  EXPECT_NE(a, b);
+  const uwb::UwbAddress address{{0x12, 0xff}};
+  EXPECT_EQ("UwbAddress{address: [18, 255]}", address.toString());
+  EXPECT_NE(uwb::RangingRoundControl{}, control);
 }
 
 // Services and callbacks alike carry the version and hash recorded at freezing.
@@ -84,9 +73,8 @@ class TestUwb : public uwb::BnUwb {
   }
 };
 
-// Client and service share this thread, the one that set up polling, so
-// calls run at once; they pass the same boundary checks as from any other
-// thread.
+// Client and service share this thread, the one that set up polling, so calls
+// run at once, through the same boundary checks as from any other thread.
 class InterfaceTest : public ::testing::Test {
  protected:
   void SetUp() override {
@@ -94,7 +82,6 @@ class InterfaceTest : public ::testing::Test {
     ASSERT_EQ(STATUS_OK, ABinderProcess_setupPolling(&fd));
     ASSERT_EQ(EX_NONE, AServiceManager_addService(service_->asBinder().get(), instance_.c_str()));
     proxy_ = uwb::IUwb::fromBinder(ndk::SpAIBinder(AServiceManager_getService(instance_.c_str())));
-    ASSERT_NE(nullptr, std::dynamic_pointer_cast<uwb::BpUwb>(proxy_));
   }
   void TearDown() override { ndk::host::ResetForTesting(); }
 
@@ -141,8 +128,7 @@ TEST_F(InterfaceTest, CallsFailAsTheyWouldCrossingAProcessBoundary) {
 // service's instance, at the version the library was frozen at.
 TEST_F(InterfaceTest, OnlyTheFragmentsInstanceRegistersAtTheFrozenVersion) {
   std::string error;
-  std::optional<ndk::host::VintfManifest> manifest =
-      ndk::host::VintfManifest::Load(DALIX_VINTF_FRAGMENT, &error);
+  auto manifest = ndk::host::VintfManifest::Load(DALIX_VINTF_FRAGMENT, &error);
   ASSERT_TRUE(manifest.has_value()) << error;
   ASSERT_EQ(1u, manifest->instances().size());
   const int32_t frozen_version = uwb::IUwb::version;  // a copy: the constant has no definition

@@ -91,7 +91,6 @@ TEST_F(BinderProcessTest, ClientCallsWaitForAHandlingThreadAndRunThereOneAtATime
     });
   }
   ASSERT_TRUE(Readable(fd_));
-  EXPECT_TRUE(ran_on.empty()) << "a call ran before the commands were handled";
   std::thread handler([&] {
     while (finished < kClients) {
       if (Readable(fd_, 20)) ABinderProcess_handlePolledCommands();
@@ -136,17 +135,14 @@ TEST_F(BinderProcessTest, KilledBinderNotifiesEachLiveLinkOnceOnThePollingThread
 TEST_F(BinderProcessTest, BinderKeepsItsObject) {
   std::weak_ptr<Thing> watch = thing_;
   ndk::SpAIBinder binder = thing_->asBinder();
-  EXPECT_EQ(binder_, binder.get());
-  EXPECT_EQ(1, AIBinder_debugGetRefCount(binder.get()));
   thing_.reset();
   EXPECT_FALSE(watch.expired());
   binder.set(nullptr);
   EXPECT_TRUE(watch.expired());
 }
 
-// The descriptions are the platform's own texts, which clients and bug
-// reports show; each names every part of its status, with the platform's
-// numbers, which clients compare.
+// The platform's own texts, which clients and bug reports show: each names
+// every part of its status, with the numbers clients compare.
 TEST(StatusTest, EachConstructorDescribesItsParts) {
   static_assert(STATUS_UNKNOWN_ERROR == INT32_MIN && STATUS_FAILED_TRANSACTION == INT32_MIN + 2 &&
                 STATUS_DEAD_OBJECT == -EPIPE);
@@ -169,9 +165,8 @@ TEST(StatusTest, EachConstructorDescribesItsParts) {
   }
 }
 
-// What crashes on the device aborts here, naming the misuse: an object owned
-// other than through make() (owned twice there) and reading any part of an
-// empty status but isOk().
+// What crashes on the device aborts here, naming the misuse: an object not
+// owned through make() (owned twice there), reading an empty status.
 TEST(MisuseDeathTest, AbortsNamingTheMisuse) {
   GTEST_FLAG_SET(death_test_style, "threadsafe");
   EXPECT_DEATH(std::make_shared<Thing>(), "not created by SharedRefBase::make\\(\\) was destroyed");

@@ -25,8 +25,6 @@ BREAKAGES = [
 
 
 class CheckSepolicyTest(unittest.TestCase):
-    """The project's own policy passing is the test sepolicy_self_contained."""
-
     def test_each_breakage_fails_naming_its_cause(self):
         for name, text, expected in BREAKAGES:
             with self.subTest(text), tempfile.TemporaryDirectory() as work:

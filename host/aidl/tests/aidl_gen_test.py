@@ -17,13 +17,12 @@ import api_dump  # noqa: E402
 from aidl_parser import parse_package  # noqa: E402
 
 SOURCE_DIR = os.environ.get('DALIX_SOURCE_DIR', os.path.join(HERE, '..', '..', '..'))
-PACKAGE_DIR = os.path.join(SOURCE_DIR, 'aidl', 'aidl', 'hardware', 'dalix', 'uwb')
 API_DIR = os.path.join(SOURCE_DIR, 'aidl', 'aidl_api', 'aidl.hardware.dalix.uwb')
-SOURCES = sorted(str(p) for p in pathlib.Path(PACKAGE_DIR).glob('*.aidl'))
+SOURCES = sorted(map(str, pathlib.Path(SOURCE_DIR, 'aidl/aidl/hardware/dalix/uwb').glob('*.aidl')))
 IMPORT = 'import aidl.hardware.dalix.uwb.'
 
-# (what follows the package line, line of the error, reason). Each file is
-# named after the type it declares.
+# (what follows the package line, and @VintfStability unless it imports; line
+# of the error; reason). Each file is named after the type it declares.
 REFUSALS = [
     ('interface IOneway {\noneway void f();\n}\n', 4, 'oneway methods are not supported'),
     ('@Backing(type="byte")\nenum Big {\nA = 127,\nB,\n}\n', 6, 'does not fit the byte backing'),
@@ -41,7 +40,6 @@ REFUSALS = [
 
 
 def generator(*args):
-    """Runs the generator's command line; its status and what it printed."""
     run = subprocess.run([sys.executable, '-B', aidl_gen.__file__, *args], capture_output=True,
                          text=True)
     return run.returncode, run.stdout, run.stderr
@@ -65,7 +63,6 @@ class GeneratorTest(unittest.TestCase):
         self.dir = self.enterContext(tempfile.TemporaryDirectory())
 
     def write(self, text):
-        """|text| follows the package line, and @VintfStability unless it imports."""
         path = os.path.join(self.dir, re.search(r'(\w+) {', text).group(1) + '.aidl')
         stability = '' if text.startswith('import') else '@VintfStability\n'
         pathlib.Path(path).write_text('package aidl.hardware.dalix.uwb;\n' + stability + text)

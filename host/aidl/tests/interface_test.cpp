@@ -1,7 +1,6 @@
 #include <cstring>
 #include <fstream>
 #include <memory>
-#include <optional>
 #include <string>
 #include <type_traits>
 #include <utility>
@@ -34,8 +33,7 @@ TEST(GeneratedTypesTest, ParcelablesPrintAndCompareFieldByField) {
       "RangingRoundControl{hasResultReportPhase: true, "
       "measurementReportType: RESPONDER_TO_INITIATOR, hasDeferredMode: false}",
       control.toString());
-  const uwb::UwbAddress address{{0x12, 0xff}};
-  EXPECT_EQ("UwbAddress{address: [18, 255]}", address.toString());
+  EXPECT_EQ("UwbAddress{address: [18, 255]}", (uwb::UwbAddress{{0x12, 0xff}}.toString()));
   EXPECT_NE(uwb::RangingRoundControl{}, control);
 }
 
@@ -80,6 +78,7 @@ class InterfaceTest : public ::testing::Test {
     ASSERT_EQ(STATUS_OK, ABinderProcess_setupPolling(&fd));
     ASSERT_EQ(EX_NONE, AServiceManager_addService(service_->asBinder().get(), instance_.c_str()));
     proxy_ = uwb::IUwb::fromBinder(ndk::SpAIBinder(AServiceManager_getService(instance_.c_str())));
+    ASSERT_NE(nullptr, proxy_);
   }
   void TearDown() override { ndk::host::ResetForTesting(); }
 

@@ -97,11 +97,12 @@ TEST_F(BinderProcessTest, ClientCallsWaitForAHandlingThreadAndRunThereOneAtATime
   handler.join();
   for (std::thread& client : clients) client.join();
   EXPECT_EQ(std::vector(kClients * kCallsEach, handler_id), ran_on);
+  ABinderProcess_handlePolledCommands();
   EXPECT_FALSE(Readable(fd_, 0)) << "handling leaves the descriptor signalled";
 }
 
-// Links on a recipient of their own are never notified once it is deleted:
-// before the death, while the notice is queued, or from its own callback.
+// A recipient deleted before the death or while its notice is queued is never
+// called; one called may delete itself from inside the call.
 TEST_F(BinderProcessTest, KilledBinderNotifiesEachLiveLinkOnceOnThePollingThread) {
   Link first{recipient_.get()}, second{recipient_.get()}, unlinked{recipient_.get()};
   Link before{AIBinder_DeathRecipient_new(OnDeath)}, queued{AIBinder_DeathRecipient_new(OnDeath)};

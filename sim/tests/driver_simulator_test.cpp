@@ -7,7 +7,6 @@
 #include <cstring>
 #include <deque>
 #include <functional>
-#include <string>
 #include <vector>
 
 #include <android-base/unique_fd.h>
@@ -17,7 +16,6 @@
 
 #include "sim/test_family.h"
 #include "sim/test_family_defs.h"
-#include "tests/log_capture.h"
 
 namespace hardware {
 namespace dalix {
@@ -26,7 +24,6 @@ namespace {
 
 constexpr uint32_t kClientPort = 4242;
 constexpr uint32_t kProbeSeq = 999;
-constexpr size_t kErrorSize = NLMSG_LENGTH(sizeof(nlmsgerr));
 // A request command that leaves out the generic netlink header.
 constexpr int kNoGenericHeader = -1;
 
@@ -82,11 +79,10 @@ class DriverSimulatorTest : public ::testing::Test {
   std::vector<uint8_t> ReceiveMessage() {
     if (pending_.empty()) {
       std::vector<uint8_t> datagram(8192);
-      ssize_t size = recv(client_.get(), datagram.data(), datagram.size(), 0);
+      int size = static_cast<int>(recv(client_.get(), datagram.data(), datagram.size(), 0));
       ++datagrams_;
-      auto* header = reinterpret_cast<nlmsghdr*>(datagram.data());
-      int remaining = static_cast<int>(size);
-      for (; size > 0 && nlmsg_ok(header, remaining); header = nlmsg_next(header, &remaining)) {
+      for (auto* header = reinterpret_cast<nlmsghdr*>(datagram.data());
+           size > 0 && nlmsg_ok(header, size); header = nlmsg_next(header, &size)) {
         const auto* bytes = reinterpret_cast<const uint8_t*>(header);
         pending_.emplace_back(bytes, bytes + header->nlmsg_len);
       }
@@ -105,7 +101,7 @@ class DriverSimulatorTest : public ::testing::Test {
     EXPECT_EQ(want.seq, header->nlmsg_seq);
     EXPECT_EQ(want.multi ? NLM_F_MULTI : 0, header->nlmsg_flags & NLM_F_MULTI);
     if (want.type == NLMSG_ERROR) {
-      ASSERT_EQ(kErrorSize, message.size());
+      ASSERT_EQ(NLMSG_LENGTH(sizeof(nlmsgerr)), message.size());
       // The request's header comes back, never its payload, and the flag says so.
       EXPECT_EQ(NLM_F_CAPPED, header->nlmsg_flags & NLM_F_CAPPED);
       const auto* error = static_cast<const nlmsgerr*>(NLMSG_DATA(header));
@@ -113,14 +109,13 @@ class DriverSimulatorTest : public ::testing::Test {
       EXPECT_EQ(0, std::memcmp(&sent_, &error->msg, sizeof(sent_)));
     } else if (want.type == family_id_) {
       auto* reply = const_cast<nlmsghdr*>(header);
-      nlattr* attrs[kTestAttrMax + 1];
-      ASSERT_EQ(0, genlmsg_parse(reply, 0, attrs, kTestAttrMax, kTestPolicy));
       EXPECT_EQ(kTestCmdValue, genlmsg_hdr(reply)->cmd);
       if (want.seq != 0) {  // a reply: the family's version, not the request's
         EXPECT_EQ(kTestFamilyVersion + 2, genlmsg_hdr(reply)->version);
       }
-      ASSERT_NE(nullptr, attrs[kTestAttrValue]);
-      EXPECT_EQ(want.value, nla_get_u32(attrs[kTestAttrValue]));
+      nlattr* value = nlmsg_find_attr(reply, GENL_HDRLEN, kTestAttrValue);
+      ASSERT_TRUE(value != nullptr && nla_len(value) == sizeof(uint32_t));
+      EXPECT_EQ(want.value, nla_get_u32(value));
       // Replies go to the requester's port; events come with sequence 0.
       EXPECT_EQ(want.seq == 0 ? 0 : kClientPort, header->nlmsg_pid);
     }
@@ -195,35 +190,6 @@ TEST_F(DriverSimulatorTest, AnswersAndRefusesAsTheKernelDoes) {
     ASSERT_FALSE(next.empty());
     EXPECT_EQ(kProbeSeq, Header(next)->nlmsg_seq) << "type " << Header(next)->nlmsg_type;
   }
-}
-
-// A client that closed after its answer is gone without a word, as in the
-// kernel; a full receive buffer is worth a warning.
-TEST_F(DriverSimulatorTest, DropsSilentlyOnlyToAPortThatIsGone) {
-  LogCapture log;
-  UniqueNlMsg event = DriverSimulator::NewEvent(family_id_, kTestCmdValue);
-  EXPECT_FALSE(simulator_.SendEvent(kClientPort + 1, event.get()));
-  EXPECT_TRUE(log.Entries().empty()) << log.Text();
-
-  int sent = 0;
-  while (simulator_.SendEvent(kClientPort, event.get()) && sent < 100000) ++sent;
-  EXPECT_LT(sent, 100000);
-  EXPECT_EQ(1, log.Count(android::base::WARNING, "SendRaw: message to port " +
-                                                     std::to_string(kClientPort) +
-                                                     " dropped: " + std::strerror(EAGAIN)))
-      << log.Text();
-}
-
-TEST_F(DriverSimulatorTest, PostedTasksRunInDueOrder) {
-  auto send_value = [this](uint32_t value) {
-    UniqueNlMsg event = DriverSimulator::NewEvent(family_id_, kTestCmdValue);
-    nla_put_u32(event.get(), kTestAttrValue, value);
-    EXPECT_TRUE(simulator_.SendEvent(kClientPort, event.get()));
-  };
-  simulator_.Post([=] { send_value(3); }, std::chrono::milliseconds(30));
-  simulator_.Post([=] { send_value(1); });
-  simulator_.Post([=] { send_value(2); });
-  for (uint32_t value = 1; value <= 3; ++value) Expect(ReceiveMessage(), {family_id_, 0, value});
 }
 
 }  // namespace

@@ -3,7 +3,6 @@
 #include <fcntl.h>
 #include <unistd.h>
 
-#include <functional>
 #include <string>
 #include <vector>
 
@@ -41,19 +40,16 @@ class LooperBackedEventLoopTest : public ::testing::Test {
     ASSERT_EQ(static_cast<ssize_t>(count), write(write_end_.get(), bytes.data(), count));
   }
 
-  // Watches the read end; each wake-up takes one byte, runs |also| and
-  // records |name|, and the third one quits the loop.
-  bool WatchReads(
-      const std::string& name, const std::function<void()>& also = [] {}) {
-    return loop_.WatchFileDescriptor(read_end_.get(), EventLoop::kModeInput,
-                                     [this, name, also](int fd) {
-                                       EXPECT_EQ(read_end_.get(), fd);
-                                       char byte;
-                                       ASSERT_EQ(1, read(fd, &byte, 1));
-                                       also();
-                                       calls_.push_back(name);
-                                       if (calls_.size() == 3) loop_.Quit();
-                                     });
+  // Watches the read end; each wake-up takes one byte and records |name|,
+  // and the third one quits the loop.
+  bool WatchReads(const std::string& name) {
+    return loop_.WatchFileDescriptor(read_end_.get(), EventLoop::kModeInput, [this, name](int fd) {
+      EXPECT_EQ(read_end_.get(), fd);
+      char byte;
+      ASSERT_EQ(1, read(fd, &byte, 1));
+      calls_.push_back(name);
+      if (calls_.size() == 3) loop_.Quit();
+    });
   }
 
   LooperBackedEventLoop loop_;
@@ -95,17 +91,6 @@ TEST_F(LooperBackedEventLoopTest, InvalidModeIsRefusedAndLogged) {
   WriteBytes(1);
   PollOnce(0);
   EXPECT_FALSE(loop_.StopWatchFileDescriptor(read_end_.get()));
-}
-
-// Every caller posts from the loop thread; a task waits for the callback
-// that posted it to return.
-TEST_F(LooperBackedEventLoopTest, TasksRunAfterTheCallbackThatPostedThem) {
-  ASSERT_TRUE(WatchReads("callback", [&] { loop_.PostTask([&] { calls_.push_back("task"); }); }));
-  WriteBytes(1);
-  PollOnce(1000);
-  EXPECT_EQ(Calls{"callback"}, calls_);
-  PollOnce(1000);
-  EXPECT_EQ((Calls{"callback", "task"}), calls_);
 }
 
 }  // namespace

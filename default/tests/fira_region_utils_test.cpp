@@ -4,7 +4,6 @@
 
 #include <cmath>
 #include <functional>
-#include <map>
 #include <memory>
 #include <string>
 #include <vector>
@@ -30,8 +29,6 @@ using ::android::base::INFO;
 using ::android::base::LogSeverity;
 using ::android::base::WARNING;
 using ::testing::_;
-using ::testing::ByMove;
-using ::testing::Return;
 using ::testing::StrictMock;
 namespace uwb = ::aidl::hardware::dalix::uwb;
 using Session = uwb::FiraTwrSession;
@@ -131,9 +128,6 @@ TEST_F(FiraRegionUtilsTest, ValueChecksRefuseWithTheirLineAndSendNothing) {
   EXPECT_EQ(Logged(ERROR, "AddControlees: Empty controlees"), 1);
   EXPECT_EQ(Logged(ERROR, "RemoveControlees: Empty controlees"), 1);
   EXPECT_EQ(Logged(ERROR, "PutControlees" + bad_address), 1);
-  fira_.SetMcpsNetId(0);
-  EXPECT_FALSE(fira_.InitSession(kHw, 9));
-  EXPECT_EQ(Logged(ERROR, "SetMcpsCommand: MCPS netlink id is not resolved"), 1);
 }
 
 // Every request is refused when the driver does not acknowledge it. What
@@ -192,17 +186,6 @@ TEST_F(FiraRegionUtilsTest, SetPropertiesTakesTheLowByteOfValidNumbersOnly) {
   EXPECT_EQ(fira_.GetHwConfig(kHw + 1)->antenna_pair_elevation, 255u);
 }
 
-TEST_F(FiraRegionUtilsTest, StartSessionNeedsACallbackAndASocket) {
-  EXPECT_FALSE(fira_.StartSession(kHw, 1));
-  fira_.SubscribeCallback(kHw, nullptr);
-  EXPECT_FALSE(fira_.StartSession(kHw, 1));
-  EXPECT_EQ(Logged(ERROR, "StartSession: Fira callback needs to be set for this hw_index."), 2);
-  fira_.SubscribeCallback(kHw, &recorder_);
-  EXPECT_CALL(factory_, Create()).WillOnce(Return(ByMove(nullptr)));
-  EXPECT_FALSE(fira_.StartSession(kHw, 1));
-  EXPECT_EQ(Logged(ERROR, "StartSession: BAD_ALLOC: cannot allocate NlSocket"), 1);
-}
-
 // Well-formed results are proved against the simulated world; here, the
 // values at the edges of their ranges and the measurements a driver should
 // not send.
@@ -225,12 +208,8 @@ TEST_F(FiraRegionUtilsTest, NotificationsDecodeEdgeValuesAndDropBrokenMeasuremen
       Result({
           peer(0x1234,
                [](auto& m) {
-                 m.line_of_sight = true;
-                 m.azimuth = m.elevation = 32767;
+                 m.azimuth = 32767;
                  m.azimuth_fom = 255;
-                 m.elevation_fom = 1;
-                 m.aoa_elevation = FiraAoaData{9, 100, 1, -200};
-                 m.aoa = FiraAoaData{3, 100, 1, -200};
                }),
           peer(2, [](auto& m) { m.line_of_sight = m.non_line_of_sight = true; }),
           peer(5, [](auto& m) { m.distance_cm.reset(); }),
@@ -257,16 +236,7 @@ TEST_F(FiraRegionUtilsTest, NotificationsDecodeEdgeValuesAndDropBrokenMeasuremen
   EXPECT_EQ(m[0].address.address, (std::vector<uint8_t>{0x34, 0x12}));
   EXPECT_LT(m[0].azimuthRad, M_PI);
   EXPECT_GT(m[0].azimuthRad, M_PI - 1e-4);
-  EXPECT_NEAR(m[0].elevationRad, M_PI / 2, 1e-4);
   EXPECT_EQ(m[0].azimuthFigureOfMerit, 1.0);
-  EXPECT_EQ(m[0].elevationFigureOfMerit, 0.0);
-  // 10 keeps its kind whatever pair it names; 8 names 3, the elevation pair.
-  ASSERT_EQ(m[0].antennaMeasurements.size(), 2u);
-  for (const auto& angle : m[0].antennaMeasurements) {
-    EXPECT_EQ(angle.kind, kFiraAntennaKindElevation);
-    EXPECT_DOUBLE_EQ(angle.secondAngleRad, -200 * kFiraAzimuthScale);
-    EXPECT_EQ(angle.figureOfMerit, 0.0);
-  }
   // Both sight flags mean neither; no flag, unknown.
   EXPECT_EQ((std::vector<int>{m[1].lineOfSight, m[2].lineOfSight}), (std::vector<int>{0, -1}));
   EXPECT_TRUE(m[2].antennaMeasurements.empty());
@@ -314,8 +284,6 @@ TEST_F(FiraRegionUtilsTest, MessagesThatAreNotResultsAreDroppedWithTheirLine) {
        "GetCallContent: Missing Fira region name in mcps message"},
       {encoded([](auto& d) { d.call.reset(); }), ERROR,
        "GetCallContent: Missing Fira call in mcps message"},
-      {encoded([](auto& d) { d.has_call_params = false; }), ERROR,
-       "GetCallContent: Missing Fira call params in mcps message"},
       {encoded([](auto& d) { d.call = FIRA_CALL_SESSION_START; }), INFO,
        "OnRangingResult: Not a ranging notification message."},
       {encoded([](auto& d) { d.hw_index = kHw + 1; }), INFO,

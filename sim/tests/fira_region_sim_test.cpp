@@ -188,19 +188,15 @@ TEST_F(FiraRegionSimTest, ConfigurationReachesTheDriverAsTheSessionCallsFor) {
          s.aoaType = uwb::AoaType(7);
        },
        {{36, 2}, {37, 7}, {43, -1}}},
-      {"static STS: IV then vendor id",
+      {"static STS: IV then vendor id; elevation, no retries",
        [](uwb::FiraTwrSession& s) {
          s.stsConfig = uwb::FiraStsConfig(0);
          s.staticStsIV = {1, 2, 3, 4, 5, 6};
          s.vendorId = {0xa, 0xb};
-       },
-       {{36, 0}, {38, -1}}},  // The key is kept apart.
-      {"elevation, no retries",
-       [](uwb::FiraTwrSession& s) {
          s.aoaType = uwb::AoaType(1);
          s.maxRangingRoundRetries = 0;
        },
-       {{12, -1}, {32, -1}, {33, 255}}},
+       {{12, -1}, {32, -1}, {33, 255}, {36, 0}, {38, -1}}},  // The key is kept apart.
       {"both in pair mode",
        [](uwb::FiraTwrSession& s) {
          s.aoaType = uwb::AoaType(2);

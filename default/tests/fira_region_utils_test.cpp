@@ -106,7 +106,6 @@ TEST_F(FiraRegionUtilsTest, ValueChecksRefuseWithTheirLineAndSendNothing) {
        "PutMainSessionParams" + bad_address},
       {[](Session& s) { s.destAddressList[0].address = {1}; },
        "PutMainSessionParams" + bad_address},
-      {[](Session& s) { s.destAddressList.clear(); }, "PutMainSessionParams" + bad_address},
       {[](Session& s) { s.rframeConfig = uwb::RframeConfig(2); },
        "PutRadioParams: Unsupported Rframe config 2"},
       {[](Session& s) { s.psduDataRate = uwb::PsduDataRate(-1); },
@@ -186,67 +185,13 @@ TEST_F(FiraRegionUtilsTest, SetPropertiesTakesTheLowByteOfValidNumbersOnly) {
   EXPECT_EQ(fira_.GetHwConfig(kHw + 1)->antenna_pair_elevation, 255u);
 }
 
-// Well-formed results are proved against the simulated world; here, the
-// values at the edges of their ranges and the measurements a driver should
-// not send.
-TEST_F(FiraRegionUtilsTest, NotificationsDecodeEdgeValuesAndDropBrokenMeasurements) {
+// Well-formed results are proved against the simulated world; here, what a
+// driver should not send, and values at the edges of their ranges.
+TEST_F(FiraRegionUtilsTest, BrokenNotificationsAndMeasurementsAreDroppedWithTheirLine) {
   fira_.SubscribeCallback(kHw, &recorder_);
   config_.Set("antenna_pair_azimuth", "2");
   config_.Set("antenna_pair_elevation", "3");
   fira_.SetProperties(kHw, config_);
-  auto peer = [](uint16_t address, std::function<void(FiraMeasurementData&)> change) {
-    FiraMeasurementData m;
-    m.short_address = address;
-    m.status = 0;
-    m.distance_cm = 250;
-    change(m);
-    return m;
-  };
-  UniqueNlMsg msg;
-  ASSERT_TRUE(sim::EncodeFiraNotification(
-      msg.get(), kFamily,
-      Result({
-          peer(0x1234,
-               [](auto& m) {
-                 m.azimuth = 32767;
-                 m.azimuth_fom = 255;
-               }),
-          peer(2, [](auto& m) { m.line_of_sight = m.non_line_of_sight = true; }),
-          peer(5, [](auto& m) { m.distance_cm.reset(); }),
-          peer(6, [](auto& m) { m.short_address.reset(); }),
-          peer(7,
-               [](auto& m) {
-                 m.aoa_azimuth = FiraAoaData{2, 1, 2, std::nullopt};
-               }),
-          peer(8,
-               [](auto& m) {
-                 m.aoa = FiraAoaData{4, 1, 2, 3};
-                 m.aoa_azimuth = FiraAoaData{std::nullopt, 1, 2, 3};
-               }),
-      })));
-  EXPECT_EQ(fira_.OnRangingResult(msg.get()), NL_STOP);
-  for (const std::string text : {"ParseMeasurements: Missing addr or status in ranging measurement",
-                                 "ParseMeasurements: Missing fields in ranging measurement",
-                                 "ParseAntennaMeasurement: Missing aoa data measurement fields"}) {
-    EXPECT_EQ(Logged(ERROR, text), 1) << text;
-  }
-  ASSERT_EQ(recorder_.results.size(), 1u);
-  const auto& m = recorder_.results[0].second;
-  ASSERT_EQ(m.size(), 4u);
-  EXPECT_EQ(m[0].address.address, (std::vector<uint8_t>{0x34, 0x12}));
-  EXPECT_LT(m[0].azimuthRad, M_PI);
-  EXPECT_GT(m[0].azimuthRad, M_PI - 1e-4);
-  EXPECT_EQ(m[0].azimuthFigureOfMerit, 1.0);
-  // Both sight flags mean neither; no flag, unknown.
-  EXPECT_EQ((std::vector<int>{m[1].lineOfSight, m[2].lineOfSight}), (std::vector<int>{0, -1}));
-  EXPECT_TRUE(m[2].antennaMeasurements.empty());
-  // 9 is azimuth data whatever it names; 8 of pair 4 is no pair of this radio.
-  ASSERT_EQ(m[3].antennaMeasurements.size(), 1u);
-  EXPECT_EQ(m[3].antennaMeasurements[0].kind, kFiraAntennaKindAzimuth);
-}
-
-TEST_F(FiraRegionUtilsTest, MessagesThatAreNotResultsAreDroppedWithTheirLine) {
-  fira_.SubscribeCallback(kHw, &recorder_);
   // A notification encoded as the driver would, then |mutate|d.
   auto encoded = [](std::function<void(FiraNotificationData&)> change,
                     std::function<void(nl_msg*)> mutate = nullptr) {
@@ -325,6 +270,56 @@ TEST_F(FiraRegionUtilsTest, MessagesThatAreNotResultsAreDroppedWithTheirLine) {
   EXPECT_EQ(Logged(ERROR, "ParseAntennaMeasurement: Failed to parse aoa data measurement"), 1);
   ASSERT_EQ(recorder_.results.size(), 1u);
   EXPECT_EQ(recorder_.results[0].second.size(), 1u);
+  recorder_.results.clear();
+
+  auto peer = [](uint16_t address, std::function<void(FiraMeasurementData&)> change) {
+    FiraMeasurementData m;
+    m.short_address = address;
+    m.status = 0;
+    m.distance_cm = 250;
+    change(m);
+    return m;
+  };
+  fira_.OnRangingResult(
+      encoded([&](auto& d) {
+        d.measurements = {
+            peer(0x1234,
+                 [](auto& m) {
+                   m.azimuth = 32767;
+                   m.azimuth_fom = 255;
+                 }),
+            peer(2, [](auto& m) { m.line_of_sight = m.non_line_of_sight = true; }),
+            peer(5, [](auto& m) { m.distance_cm.reset(); }),
+            peer(6, [](auto& m) { m.short_address.reset(); }),
+            peer(7,
+                 [](auto& m) {
+                   m.aoa_azimuth = FiraAoaData{2, 1, 2, std::nullopt};
+                 }),
+            peer(8,
+                 [](auto& m) {
+                   m.aoa = FiraAoaData{4, 1, 2, 3};
+                   m.aoa_azimuth = FiraAoaData{std::nullopt, 1, 2, 3};
+                 }),
+        };
+      })->get());
+  for (const std::string text : {"ParseMeasurements: Missing addr or status in ranging measurement",
+                                 "ParseMeasurements: Missing fields in ranging measurement",
+                                 "ParseAntennaMeasurement: Missing aoa data measurement fields"}) {
+    EXPECT_EQ(Logged(ERROR, text), 1) << text;
+  }
+  ASSERT_EQ(recorder_.results.size(), 1u);
+  const auto& m = recorder_.results[0].second;
+  ASSERT_EQ(m.size(), 4u);
+  EXPECT_EQ(m[0].address.address, (std::vector<uint8_t>{0x34, 0x12}));
+  EXPECT_LT(m[0].azimuthRad, M_PI);
+  EXPECT_GT(m[0].azimuthRad, M_PI - 1e-4);
+  EXPECT_EQ(m[0].azimuthFigureOfMerit, 1.0);
+  // Both sight flags mean neither; no flag, unknown.
+  EXPECT_EQ((std::vector<int>{m[1].lineOfSight, m[2].lineOfSight}), (std::vector<int>{0, -1}));
+  EXPECT_TRUE(m[2].antennaMeasurements.empty());
+  // 9 is azimuth data whatever it names; 8 of pair 4 is no pair of this radio.
+  ASSERT_EQ(m[3].antennaMeasurements.size(), 1u);
+  EXPECT_EQ(m[3].antennaMeasurements[0].kind, kFiraAntennaKindAzimuth);
 }
 
 }  // namespace

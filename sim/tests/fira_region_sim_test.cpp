@@ -81,8 +81,7 @@ class FiraRegionSimTest : public ::testing::Test {
     fira_.SubscribeCallback(1, &recorder_);
   }
 
-  // Serves the ranging socket on this thread until |done| holds or |limit|
-  // has passed, through the looper that the service's loop registered it with.
+  // Serves the ranging socket on this thread until |done| or |limit|.
   void RunUntil(const std::function<bool()>& done,
                 std::chrono::milliseconds limit = std::chrono::seconds(5)) {
     android::sp<android::Looper> looper = android::Looper::getForThread();
@@ -164,8 +163,7 @@ TEST_F(FiraRegionSimTest, SessionRangesTheWorldsPeersUntilStopped) {
   EXPECT_FALSE(region_.Session(0, 5));
 }
 
-// What the driver keeps of a session's configuration, on a radio without
-// antenna properties: every parameter the session calls for, each at its own
+// The driver keeps every parameter the session calls for, each at its own
 // width, and nothing else.
 TEST_F(FiraRegionSimTest, ConfigurationReachesTheDriverAsTheSessionCallsFor) {
   const struct {
@@ -203,7 +201,6 @@ TEST_F(FiraRegionSimTest, ConfigurationReachesTheDriverAsTheSessionCallsFor) {
          s.deviceRole = uwb::DeviceRole(0);
        },
        {{2, 0}, {33, 255}, {35, 1}}},
-      {"both", [](uwb::FiraTwrSession& s) { s.aoaType = uwb::AoaType(2); }, {{33, 255}, {35, 0}}},
       {"other switches, negative retries, signed and wide values",
        [](uwb::FiraTwrSession& s) {
          s.isKeyRotationEnabled = s.isTxAdaptivePayloadPowerEnabled = true;
@@ -262,10 +259,8 @@ TEST_F(FiraRegionSimTest, SessionsOnTwoRadiosShareOneSocketUntilTheLastUnsubscri
     ASSERT_TRUE(fira_.InitSession(hw, 7 + hw));
     ASSERT_TRUE(fira_.ConfigTwrSession(hw, AngleSession(7 + hw)));
   }
-  // A notification sent before the first start is acknowledged would come
-  // before libnl takes unsolicited messages on the new socket; from the
-  // second start on, one reaches the callback while the start awaits its
-  // acknowledgement.
+  // From the second start on, a notification reaches the callback while the
+  // start awaits its acknowledgement.
   ASSERT_TRUE(fira_.StartSession(0, 7));
   region_.SetNotifyOnStart(true);
   ASSERT_TRUE(fira_.StartSession(1, 8));

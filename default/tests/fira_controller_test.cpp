@@ -255,20 +255,18 @@ Op Stopped(uint32_t id) {
     return ScopedAStatus::ok();
   };
 }
-FiraTwrSession Controlee(int32_t id) {
-  FiraTwrSession session = ValidFiraSession(id);
-  session.deviceType = DeviceType::CONTROLEE;
-  return session;
-}
 
 TEST_F(FiraControllerTest, EveryOperationFromEveryState) {
   const std::vector<UwbAddress> kOne = {{{0, 7}}}, kTwo = {{{0, 7}}, {{0, 8}}};
   const std::string kNoCallback = "-7 You need to register callbacks on the controller first.||";
+  FiraTwrSession controlee = ValidFiraSession(2);
+  controlee.deviceType = DeviceType::CONTROLEE;
   const Case cases[] = {
       // Sessions are created with the region set and the interface down
       // (the first one through the service is proved against the simulator).
-      {kInit, OP(initNewTwrSession, Controlee(2)), "", "0|Hw Init2 Config2 Up? Addr|1:0 2:0 #0"},
-      {kRun, OP(initNewTwrSession, Controlee(1)), "", "-3 Session with id 1 already exist||1:1 #1"},
+      {kInit, OP(initNewTwrSession, controlee), "", "0|Hw Init2 Config2 Up? Addr|1:0 2:0 #0"},
+      {kRun, OP(initNewTwrSession, ValidFiraSession(1)), "",
+       "-3 Session with id 1 already exist||1:1 #1"},
       {kEmpty, OP(initNewTwrSession, ValidFiraSession(1, {})), "",
        "-3 The device is controller of the session, destAddressList should not be empty||#0"},
 

@@ -52,17 +52,6 @@ void Shorten(nl_msg* msg, std::initializer_list<int> path, int bytes) {
   attr->nla_len = static_cast<uint16_t>(NLA_HDRLEN + bytes);
 }
 
-// A result of session 77 on |kHw| with |measurements|.
-FiraNotificationData Result(std::vector<FiraMeasurementData> measurements) {
-  FiraNotificationData d;
-  d.hw_index = kHw;
-  d.session_id = 77;
-  d.index = 5;
-  d.timestamp_ns = 123456789;
-  d.measurements = std::move(measurements);
-  return d;
-}
-
 class FiraRegionUtilsTest : public ::testing::Test {
  protected:
   void SetUp() override { fira_.SetMcpsNetId(kFamily); }
@@ -195,7 +184,11 @@ TEST_F(FiraRegionUtilsTest, BrokenNotificationsAndMeasurementsAreDroppedWithThei
   // A notification encoded as the driver would, then |mutate|d.
   auto encoded = [](std::function<void(FiraNotificationData&)> change,
                     std::function<void(nl_msg*)> mutate = nullptr) {
-    FiraNotificationData data = Result({});
+    FiraNotificationData data;
+    data.hw_index = kHw;
+    data.session_id = 77;
+    data.index = 5;
+    data.measurements.emplace();
     change(data);
     auto msg = std::make_shared<UniqueNlMsg>();
     EXPECT_TRUE(sim::EncodeFiraNotification(msg->get(), kFamily, data));

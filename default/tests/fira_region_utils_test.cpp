@@ -181,6 +181,14 @@ TEST_F(FiraRegionUtilsTest, BrokenNotificationsAndMeasurementsAreDroppedWithThei
   config_.Set("antenna_pair_azimuth", "2");
   config_.Set("antenna_pair_elevation", "3");
   fira_.SetProperties(kHw, config_);
+  auto peer = [](uint16_t address, std::function<void(FiraMeasurementData&)> change) {
+    FiraMeasurementData m;
+    m.short_address = address;
+    m.status = 0;
+    m.distance_cm = 250;
+    change(m);
+    return m;
+  };
   // A notification encoded as the driver would, then |mutate|d.
   auto encoded = [](std::function<void(FiraNotificationData&)> change,
                     std::function<void(nl_msg*)> mutate = nullptr) {
@@ -246,9 +254,10 @@ TEST_F(FiraRegionUtilsTest, BrokenNotificationsAndMeasurementsAreDroppedWithThei
   // A measurement's address and another's angle of the wrong width drop
   // only themselves.
   auto broken = encoded(
-      [](auto& d) {
-        d.measurements = {{1, false, 0, false, false, 1}, {2, false, 0, false, false, 1}};
-        (*d.measurements)[1].aoa_azimuth = FiraAoaData{1, 1, 1, 1};
+      [&](auto& d) {
+        d.measurements = {peer(1, [](auto&) {}), peer(2, [](auto& m) {
+                            m.aoa_azimuth = FiraAoaData{1, 1, 1, 1};
+                          })};
       },
       [&](nl_msg* m) {
         const int list = FIRA_RANGING_DATA_ATTR_MEASUREMENTS;
@@ -265,14 +274,6 @@ TEST_F(FiraRegionUtilsTest, BrokenNotificationsAndMeasurementsAreDroppedWithThei
   EXPECT_EQ(recorder_.results[0].second.size(), 1u);
   recorder_.results.clear();
 
-  auto peer = [](uint16_t address, std::function<void(FiraMeasurementData&)> change) {
-    FiraMeasurementData m;
-    m.short_address = address;
-    m.status = 0;
-    m.distance_cm = 250;
-    change(m);
-    return m;
-  };
   fira_.OnRangingResult(
       encoded([&](auto& d) {
         d.measurements = {

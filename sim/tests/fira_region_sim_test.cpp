@@ -170,21 +170,25 @@ TEST_F(FiraRegionSimTest, ConfigurationReachesTheDriverAsTheSessionCallsFor) {
     std::function<void(uwb::FiraTwrSession&)> change;
     std::map<int, int64_t> delta;  // -1: not sent
   } cases[] = {
-      {"driver controlee: no destination, its report phases",
+      {"driver controlee: no destination, its report phases; both angles",
        [](uwb::FiraTwrSession& s) {
          s.deviceType = uwb::DeviceType(0);
          s.stsConfig = uwb::FiraStsConfig(2);
          s.rangingRoundControl = {false, uwb::MeasurementReportType(1), true};
+         s.aoaType = uwb::AoaType(2);
        },
-       {{1, 1}, {6, -1}, {16, 0}, {17, 1}, {18, -1}, {36, 2}}},
-      {"driver controller: no report phases, a sub-session; no angles, whatever the type",
+       {{1, 1}, {6, -1}, {16, 0}, {17, 1}, {18, -1}, {33, 255}, {35, 0}, {36, 2}}},
+      {"driver controller: no report phases, a sub-session, no angles whatever the type; "
+       "block striding, negative retries",
        [](uwb::FiraTwrSession& s) {
          s.stsConfig = uwb::FiraStsConfig(2);
          s.rangingRoundControl = {false, uwb::MeasurementReportType(1), false};
          s.aoaResultRequest = uwb::AoaResultRequest(0);
          s.aoaType = uwb::AoaType(7);
+         s.isBlockStridingEnabled = true;
+         s.maxRangingRoundRetries = -1;
        },
-       {{36, 2}, {37, 7}, {43, -1}}},
+       {{11, 3}, {12, -1}, {14, 1}, {36, 2}, {37, 7}, {43, -1}}},
       {"static STS: IV then vendor id; elevation, no retries",
        [](uwb::FiraTwrSession& s) {
          s.stsConfig = uwb::FiraStsConfig(0);
@@ -194,13 +198,16 @@ TEST_F(FiraRegionSimTest, ConfigurationReachesTheDriverAsTheSessionCallsFor) {
          s.maxRangingRoundRetries = 0;
        },
        {{12, -1}, {32, -1}, {33, 255}, {36, 0}, {38, -1}}},  // The key is kept apart.
-      {"both in pair mode",
+      {"both angles in pair mode; signed and wide values",
        [](uwb::FiraTwrSession& s) {
          s.aoaType = uwb::AoaType(2);
          s.deviceRole = uwb::DeviceRole(0);
+         s.inBandTerminationAttemptCount = -1;
+         s.channelNumber = 0x109;
+         s.sessionPriority = -56;
        },
-       {{2, 0}, {33, 255}, {35, 1}}},
-      {"other switches, negative retries, signed and wide values",
+       {{2, 0}, {15, 200}, {19, 0xffffffff}, {20, 9}, {33, 255}, {35, 1}}},
+      {"other switches",
        [](uwb::FiraTwrSession& s) {
          s.isKeyRotationEnabled = s.isTxAdaptivePayloadPowerEnabled = true;
          s.keyRotationRate = 4;
@@ -210,27 +217,8 @@ TEST_F(FiraRegionSimTest, ConfigurationReachesTheDriverAsTheSessionCallsFor) {
          s.prfMode = uwb::PrfMode(1);
          s.preambleDuration = uwb::PreambleDuration(0);
          s.bprfPhrDataRate = uwb::BprfPhrDataRate(0);
-         s.isBlockStridingEnabled = true;
-         s.maxRangingRoundRetries = -1;
-         s.inBandTerminationAttemptCount = -1;
-         s.channelNumber = 0x109;
-         s.sessionPriority = -56;
        },
-       {{11, 3},
-        {12, -1},
-        {13, -1},
-        {14, 1},
-        {15, 200},
-        {18, -1},
-        {19, 0xffffffff},
-        {20, 9},
-        {23, -1},
-        {24, 0},
-        {28, -1},
-        {29, 1},
-        {30, 1},
-        {41, 1},
-        {42, 4}}},
+       {{41, 1}, {42, 4}, {30, 1}, {29, 1}, {13, -1}, {18, -1}, {23, -1}, {24, 0}, {28, -1}}},
   };
   int32_t id = 100;
   for (const auto& c : cases) {

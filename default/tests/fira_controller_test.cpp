@@ -245,9 +245,7 @@ class FiraControllerTest : public ::testing::Test {
 };
 
 // A call of the controller's |method| with the arguments that follow.
-// clang-format off
 #define OP(method, ...) [=](FiraController& c) { return c.method(__VA_ARGS__); }
-// clang-format on
 
 Op Stopped(uint32_t id) {
   return [id](FiraController& c) {
@@ -262,8 +260,7 @@ TEST_F(FiraControllerTest, EveryOperationFromEveryState) {
   FiraTwrSession controlee = ValidFiraSession(2);
   controlee.deviceType = DeviceType::CONTROLEE;
   const Case cases[] = {
-      // Sessions are created with the region set and the interface down
-      // (the first one through the service is proved against the simulator).
+      // A controlee's session: no controlees to add.
       {kInit, OP(initNewTwrSession, controlee), "", "0|Hw Init2 Config2 Up? Addr|1:0 2:0 #0"},
       {kRun, OP(initNewTwrSession, ValidFiraSession(1)), "",
        "-3 Session with id 1 already exist||1:1 #1"},

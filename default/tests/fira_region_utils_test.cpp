@@ -40,8 +40,7 @@ constexpr uint32_t kFamily = 0x1d;
 constexpr uint32_t kHw = 3;
 constexpr char kTag[] = "dalix.uwb.FiraRegionUtils";
 
-// Shortens the payload of the attribute at |path|, each type found inside the
-// one before, to |bytes|: the message's layout stays as it was.
+// Shortens the payload at |path|, each type inside the one before, in place.
 void Shorten(nl_msg* msg, std::initializer_list<int> path, int bytes) {
   nlattr* attr = nullptr;
   for (int type : path) {
@@ -89,9 +88,7 @@ TEST_F(FiraRegionUtilsTest, ValueChecksRefuseWithTheirLineAndSendNothing) {
        "PutMainSessionParams: Unsupported rangingRoundUsage OWR"},
       {[](Session& s) { s.multiNodeMode = uwb::MultiNodeMode(2); },
        "PutMainSessionParams: Unsupported multiNodeMode MANY_TO_MANY"},
-      {[](Session& s) {
-         s.deviceAddress.address = {1, 2, 3};
-       },
+      {[](Session& s) { s.deviceAddress.address.push_back(3); },
        "PutMainSessionParams" + bad_address},
       {[](Session& s) { s.destAddressList[0].address = {1}; },
        "PutMainSessionParams" + bad_address},
@@ -251,8 +248,7 @@ TEST_F(FiraRegionUtilsTest, BrokenNotificationsAndMeasurementsAreDroppedWithThei
   }
   EXPECT_TRUE(recorder_.results.empty());
   EXPECT_TRUE(recorder_.stopped.empty());
-  // A measurement's address and another's angle of the wrong width drop
-  // only themselves.
+  // A field of the wrong width drops only its measurement or angle.
   auto broken = encoded(
       [&](auto& d) {
         d.measurements = {peer(1, [](auto&) {}), peer(2, [](auto& m) {

@@ -33,8 +33,7 @@ inline aidl::hardware::dalix::uwb::FiraTwrSession ValidFiraSession(
   return session;
 }
 
-// ValidFiraSession as a driver controller (interface value 1) that also sets
-// most optional switches, ranging with 0x5678 and 0x9abc.
+// A driver controller (value 1) ranging with 0x5678 and 0x9abc, most switches set.
 inline aidl::hardware::dalix::uwb::FiraTwrSession FullFiraSession(int32_t id) {
   namespace uwb = aidl::hardware::dalix::uwb;
   uwb::FiraTwrSession s = ValidFiraSession(id, {0x5678, 0x9abc});

@@ -1,6 +1,7 @@
 #include "net/ieee_utils.h"
 
 #include <functional>
+#include <iterator>
 #include <memory>
 #include <string>
 #include <utility>
@@ -53,23 +54,19 @@ class IeeeUtilsTest : public ::testing::Test {
 // Replies the simulator never sends, with attributes missing or too short:
 // each is skipped with its own line, and nothing is read past its end.
 TEST_F(IeeeUtilsTest, BrokenRepliesAreSkippedWithTheirOwnLine) {
-  const char kNoPhyOrCaps[] = "operator(): Incorrect attr in CMD_GET_WPAN_PHY response";
-  const struct {
-    uint8_t cmd;
-    std::string error;  // empty: the reply is read, with no channel to add
-  } cases[] = {
-      {NL802154_CMD_NEW_INTERFACE, "operator(): Incorrect attr in NL802154_CMD_GET_INTERFACE dump"},
-      {NL802154_CMD_NEW_WPAN_PHY, kNoPhyOrCaps},
-      {NL802154_CMD_NEW_WPAN_PHY, "operator(): Failed to parse CMD_GET_WPAN_PHY"},
-      {NL802154_CMD_NEW_WPAN_PHY,
-       "operator(): Incorrect NL802154_CAP_ATTR_CHANNELS in CMD_GET_WPAN_PHY"},
-      {NL802154_CMD_NEW_WPAN_PHY, ""},
-      {NL802154_CMD_NEW_WPAN_PHY, kNoPhyOrCaps},
+  // The first reply is an entry of the interface dump; the others describe a phy.
+  const std::string errors[] = {
+      "operator(): Incorrect attr in NL802154_CMD_GET_INTERFACE dump",
+      "operator(): Incorrect attr in CMD_GET_WPAN_PHY response",
+      "operator(): Failed to parse CMD_GET_WPAN_PHY",
+      "operator(): Incorrect NL802154_CAP_ATTR_CHANNELS in CMD_GET_WPAN_PHY",
+      "",  // read, with no channel to add
+      "operator(): Incorrect attr in CMD_GET_WPAN_PHY response",
   };
-  std::vector<UniqueNlMsg> replies;
-  for (const auto& c : cases) {
-    replies.emplace_back();
-    genlmsg_put(replies.back().get(), 0, 0, kFamilyId, 0, 0, c.cmd, 0);
+  std::vector<UniqueNlMsg> replies(std::size(errors));
+  for (size_t i = 0; i < replies.size(); ++i) {
+    const uint8_t cmd = i == 0 ? NL802154_CMD_NEW_INTERFACE : NL802154_CMD_NEW_WPAN_PHY;
+    genlmsg_put(replies[i].get(), 0, 0, kFamilyId, 0, 0, cmd, 0);
   }
   nla_put_string(replies[0].get(), NL802154_ATTR_IFNAME, "wpan3");
   nla_put_u8(replies[0].get(), NL802154_ATTR_WPAN_PHY, 3);   // short phy index
@@ -84,17 +81,15 @@ TEST_F(IeeeUtilsTest, BrokenRepliesAreSkippedWithTheirOwnLine) {
   nla_nest_end(replies[4].get(), caps);
   nla_put(replies[5].get(), NL802154_ATTR_WPAN_PHY_CAPS, 0, nullptr);  // no phy
   for (size_t i = 0; i < replies.size(); ++i) {
-    SCOPED_TRACE(cases[i].error);
+    SCOPED_TRACE(errors[i]);
     log_.Reset();
     ExpectReply(replies[i].get());
     bool ok = false;
     PhyInfo info;
-    const bool read = cases[i].cmd == NL802154_CMD_NEW_INTERFACE ? !utils_.ListDevices(&ok).empty()
-                                                                 : utils_.GetPhyInfo(kIface, &info);
-    EXPECT_EQ(cases[i].error.empty(), read);
+    const bool read = i == 0 ? !utils_.ListDevices(&ok).empty() : utils_.GetPhyInfo(kIface, &info);
+    EXPECT_EQ(errors[i].empty(), read);
     EXPECT_TRUE(info.channels.empty());
-    EXPECT_EQ(cases[i].error.empty() ? 0 : 1, log_.Count(ERROR, cases[i].error, kTag))
-        << log_.Text();
+    EXPECT_EQ(errors[i].empty() ? 0 : 1, log_.Count(ERROR, errors[i], kTag)) << log_.Text();
   }
 }
 

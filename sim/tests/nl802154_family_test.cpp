@@ -42,22 +42,17 @@ std::string SystemError(const std::string& what, const char* iface, int error) {
   return what + " for " + iface + " (" + strerror(error) + ")";
 }
 
-// The service's IeeeUtils against the simulated family, over real sockets
-// and real interfaces; beside it the simulator's interface tool, which keeps
-// what a veth cannot hold. Every test starts with "wpan0" on phy 0.
+// The service's IeeeUtils against the simulated family, over real sockets and real interfaces;
+// beside it the simulator's interface tool. Every test starts with "wpan0" on phy 7.
 class Nl802154FamilyTest : public ::testing::Test {
  protected:
   void SetUp() override {
     simulator_.RegisterFamily(kNl802154FamilyName, &family_);
     ASSERT_TRUE(simulator_.Start());
     ASSERT_TRUE(utils_.Setup());
-    WpanDeviceConfig config{"wpan0", 0};
+    WpanDeviceConfig config{"wpan0", 7};
     config.pages = {{0, {1, 2, 3}}, {4, {0, 9, 5, 15}}, {5, {1}}};
     config.factory_address = kFactoryAddress;
-    Add(config);
-  }
-
-  void Add(const WpanDeviceConfig& config) {
     std::string error;
     ASSERT_TRUE(devices_.AddDevice(config, &error)) << error;
   }
@@ -76,8 +71,9 @@ class Nl802154FamilyTest : public ::testing::Test {
 };
 
 TEST_F(Nl802154FamilyTest, ListsEveryInterfaceHoweverPackedUntilTheFamilyIsGone) {
-  Add({"wpan1", 1});
-  Add({"uwb12", 12});
+  std::string error;
+  ASSERT_TRUE(devices_.AddDevice({"wpan1", 1}, &error) && devices_.AddDevice({"uwb12", 12}, &error))
+      << error;
   // All in one datagram with NLMSG_DONE, one per datagram, two or so per datagram.
   for (size_t bytes : {DriverSimulator::kDefaultDumpDatagramBytes, size_t{0}, size_t{120}}) {
     SCOPED_TRACE(bytes);
@@ -88,7 +84,7 @@ TEST_F(Nl802154FamilyTest, ListsEveryInterfaceHoweverPackedUntilTheFamilyIsGone)
       found.emplace_back(device.name, device.phy_index);
     }
     EXPECT_TRUE(ok);
-    EXPECT_EQ(found, (Listing{{"wpan0", 0}, {"wpan1", 1}, {"uwb12", 12}}));
+    EXPECT_EQ(found, (Listing{{"wpan0", 7}, {"wpan1", 1}, {"uwb12", 12}}));
   }
   simulator_.SetFamilyPresent(kNl802154FamilyName, false);
   EXPECT_FALSE(IeeeUtils(&factory_).Setup());
@@ -99,7 +95,7 @@ TEST_F(Nl802154FamilyTest, ChannelsComeFromTheUwbPageOnly) {
   PhyInfo info;
   info.channels = {2};  // kept: the channels are added to what the caller has
   EXPECT_TRUE(utils_.GetPhyInfo("wpan0", &info));
-  EXPECT_EQ(0u, info.phy_index);
+  EXPECT_EQ(7u, info.phy_index);
   EXPECT_EQ((std::vector<int>{2, 0, 9, 5, 15}), info.channels);
   for (int channel : {0, 15}) {
     EXPECT_TRUE(utils_.SetChannel("wpan0", channel)) << channel;

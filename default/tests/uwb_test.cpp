@@ -105,8 +105,10 @@ class UwbTest : public ::testing::Test {
   std::shared_ptr<uwb::IUwb> uwb_;
 };
 
-TEST_F(UwbTest, OpensForOneLiveClientWithBothFamiliesAndExitsWhenStopped) {
+TEST_F(UwbTest, OneLiveClientAtATimeWhoseDeathStopsFiraRangingAndFreesTheHal) {
   AddRadio(0, 0, "wpan0");
+  sim::Peer peer{0x1001, 0, sim::Motion::Circle({2, 0, 0}, 1, 1)};
+  driver_.world().AddPeer(peer);
   LogCapture log;
   StartService();
   for (auto [family, message] :
@@ -120,27 +122,47 @@ TEST_F(UwbTest, OpensForOneLiveClientWithBothFamiliesAndExitsWhenStopped) {
     EXPECT_THAT(Names(), IsEmpty());
     driver_.simulator().SetFamilyPresent(family, true);
   }
-  // With both families back, a client gets in; a second one is refused while
-  // the first lives.
-  auto first = ndk::SharedRefBase::make<Client>();
-  ASSERT_TRUE(uwb_->open(first).isOk());
-  std::shared_ptr<uwb::IUwbIface> first_iface, same;
-  ASSERT_TRUE(uwb_->getIface("wpan0", &first_iface).isOk());
-  ndk::ScopedAStatus refused = uwb_->open(ndk::SharedRefBase::make<Client>());
-  EXPECT_EQ(refused.getExceptionCode(), EX_ILLEGAL_STATE);
-  EXPECT_STREQ(refused.getMessage(), "HAL is already open");
-  ASSERT_TRUE(uwb_->getIface("wpan0", &same).isOk());
-  EXPECT_EQ(same->asBinder().get(), first_iface->asBinder().get());
+  tools::FiraOptions options;
+  options.controlees = {peer.short_address};
+  options.block_duration_ms = 20;
+  {
+    // With both families back, a client gets in; a second one is refused
+    // while the first lives, and the first one's ranging goes on.
+    tools::RangingClient client(uwb_);
+    std::string error;
+    ASSERT_TRUE(client.Open(&error) && client.StartFira("wpan0", options, &error)) << error;
+    ndk::ScopedAStatus refused = uwb_->open(ndk::SharedRefBase::make<Client>());
+    EXPECT_EQ(refused.getExceptionCode(), EX_ILLEGAL_STATE);
+    EXPECT_STREQ(refused.getMessage(), "HAL is already open");
+    ASSERT_TRUE(WaitFor([&] {
+      const std::vector<tools::PeerReading> readings = client.Readings();
+      return !readings.empty() && readings[0].results >= 3;
+    }));
+    EXPECT_TRUE(IsUp("wpan0"));
+    const std::string dump = tools::DumpService(uwb_->asBinder().get());
+    EXPECT_THAT(dump, HasSubstr("UWB HAL: open, client alive, 1 radio(s)"));
+    EXPECT_THAT(dump, HasSubstr("radio wpan0: hw index 0, phy 0, scheduler endless, interface up"));
+    EXPECT_THAT(dump, HasSubstr("FiRa: 1 session(s), 1 running"));
+    EXPECT_THAT(dump, ContainsRegex("session 1: running, [0-9]+ notification"));
 
-  // The death closes the HAL; it is handled before the next open because
-  // both go through the service thread in order.
-  ndk::host::KillBinder(first->asBinder().get());
-  EXPECT_THAT(Names(), IsEmpty());
-  EXPECT_TRUE(log.Contains(android::base::INFO, "LambdaOnDeath Uwb service has died", "dalix.Uwb"));
-  EXPECT_NE(OpenIface("wpan0")->asBinder().get(), first_iface->asBinder().get());
-  EXPECT_TRUE(uwb_->close().isOk());
-  EXPECT_THAT(Names(), IsEmpty());
+    // The death is handled before the next call: both go through the
+    // service thread in order.
+    ndk::host::KillBinder(client.client_binder().get());
+    EXPECT_THAT(Names(), IsEmpty());
+    EXPECT_TRUE(
+        log.Contains(android::base::INFO, "LambdaOnDeath Uwb service has died", "dalix.Uwb"));
+    EXPECT_FALSE(IsUp("wpan0"));
+    EXPECT_EQ(driver_.radios().Radio(0)->scheduler, kMcpsSchedulerDefault);
+    EXPECT_TRUE(driver_.fira_region().Sessions().empty());
+  }
 
+  // Session 1 again, which a leftover of the dead client's would refuse;
+  // stopping closes the HAL.
+  tools::RangingClient next(uwb_);
+  std::string error;
+  EXPECT_TRUE(next.Open(&error) && next.StartFira("wpan0", options, &error)) << error;
+  EXPECT_TRUE(next.Stop(&error)) << error;
+  EXPECT_THAT(Names(), IsEmpty());
   uwb_.reset();
   service_.Stop();
   EXPECT_TRUE(log.Contains(android::base::INFO, "UWB HAL start", "dalix.uwb.main"));
@@ -201,43 +223,6 @@ TEST_F(UwbTest, PairsDevicesWithRadiosByPhyAndLoadsCalibrationByHardwareIndex) {
   Refuse(kMcpsFamilyName, MCPS802154_CMD_GET_HW, EIO);
   EXPECT_EQ(uwb_->listHardwareIndex(&indices).getStatus(), STATUS_UNKNOWN_ERROR);
   EXPECT_THAT(indices, ElementsAre(3, 5));
-}
-
-TEST_F(UwbTest, ClientDeathDuringFiraRangingStopsTheRadioAndTheNextClientStartsClean) {
-  AddRadio(0, 0, "wpan0");
-  sim::Peer peer{0x1001, 0, sim::Motion::Circle({2, 0, 0}, 1, 1)};
-  driver_.world().AddPeer(peer);
-  StartService();
-  tools::FiraOptions options;
-  options.controlees = {peer.short_address};
-  options.block_duration_ms = 20;
-  {
-    tools::RangingClient client(uwb_);
-    std::string error;
-    ASSERT_TRUE(client.Open(&error) && client.StartFira("wpan0", options, &error)) << error;
-    ASSERT_TRUE(WaitFor([&] {
-      const std::vector<tools::PeerReading> readings = client.Readings();
-      return !readings.empty() && readings[0].results >= 3;
-    }));
-    EXPECT_TRUE(IsUp("wpan0"));
-    const std::string dump = tools::DumpService(uwb_->asBinder().get());
-    EXPECT_THAT(dump, HasSubstr("UWB HAL: open, client alive, 1 radio(s)"));
-    EXPECT_THAT(dump, HasSubstr("radio wpan0: hw index 0, phy 0, scheduler endless, interface up"));
-    EXPECT_THAT(dump, HasSubstr("FiRa: 1 session(s), 1 running"));
-    EXPECT_THAT(dump, ContainsRegex("session 1: running, [0-9]+ notification"));
-
-    ndk::host::KillBinder(client.client_binder().get());
-    EXPECT_THAT(Names(), IsEmpty());
-    EXPECT_FALSE(IsUp("wpan0"));
-    EXPECT_EQ(driver_.radios().Radio(0)->scheduler, kMcpsSchedulerDefault);
-    EXPECT_TRUE(driver_.fira_region().Sessions().empty());
-  }
-
-  // Session 1 again, which a leftover of the dead client's would refuse.
-  tools::RangingClient next(uwb_);
-  std::string error;
-  EXPECT_TRUE(next.Open(&error) && next.StartFira("wpan0", options, &error)) << error;
-  EXPECT_TRUE(next.Stop(&error)) << error;
 }
 
 // Keeps each request's first result.

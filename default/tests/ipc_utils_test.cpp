@@ -25,7 +25,6 @@ TEST(IpcUtilsTest, ArgumentChecksGiveIllegalArgumentWithLoggedMessage) {
       {IllegalArgument("%s", x.c_str()), x.substr(0, 1023)},
   };
   for (const auto& c : cases) {
-    SCOPED_TRACE(c.message.substr(0, 40));
     EXPECT_EQ(c.message.empty() ? EX_NONE : EX_ILLEGAL_ARGUMENT, c.status.getExceptionCode());
     EXPECT_EQ(c.message, c.status.getMessage());
     if (!c.message.empty()) {

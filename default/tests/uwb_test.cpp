@@ -9,7 +9,6 @@
 #include <map>
 #include <memory>
 #include <mutex>
-#include <optional>
 #include <string>
 #include <thread>
 #include <tuple>
@@ -79,25 +78,10 @@ class UwbTest : public ::testing::Test {
         ndk::SpAIBinder(AServiceManager_checkService(ServiceInstanceName().c_str())));
     ASSERT_NE(uwb_, nullptr);
   }
-  // Opens the HAL for a new client and returns the radio |ifname|.
-  std::shared_ptr<uwb::IUwbIface> OpenIface(const std::string& ifname) {
-    std::shared_ptr<uwb::IUwbIface> iface;
-    EXPECT_TRUE(uwb_->open(ndk::SharedRefBase::make<Client>()).isOk());
-    EXPECT_TRUE(uwb_->getIface(ifname, &iface).isOk());
-    return iface;
-  }
   std::vector<std::string> Names() {
     std::vector<std::string> names;
     EXPECT_TRUE(uwb_->listIfaceNames(&names).isOk());
     return names;
-  }
-  bool IsUp(const std::string& ifname) {
-    std::optional<sim::WpanDevice> device = driver_.devices().FindByName(ifname);
-    return device.has_value() && device->up;
-  }
-  // The driver refuses every |cmd| of |family| with |error|.
-  void Refuse(const char* family, uint8_t cmd, int error) {
-    driver_.simulator().SetCommandFault(family, cmd, sim::Fault{sim::Fault::Kind::kError, error});
   }
 
   sim::SimulatedDriver driver_;
@@ -121,9 +105,8 @@ TEST_F(UwbTest, OneLiveClientAtATimeWhoseDeathStopsFiraRangingAndFreesTheHal) {
     EXPECT_STREQ(status.getMessage(), message);
     driver_.simulator().SetFamilyPresent(family, true);
   }
-  tools::FiraOptions options;
-  options.controlees = {peer.short_address};
-  options.block_duration_ms = 20;
+  // Session 1 from 0x0001 to the peer, on channel 9, a block every 20 ms.
+  const tools::FiraOptions options{1, 0x0001, {peer.short_address}, 9, 20};
   {
     // With both families back, a client gets in; a second one is refused
     // while the first lives, and the first one's ranging goes on.
@@ -149,7 +132,7 @@ TEST_F(UwbTest, OneLiveClientAtATimeWhoseDeathStopsFiraRangingAndFreesTheHal) {
     EXPECT_THAT(Names(), IsEmpty());
     EXPECT_TRUE(
         log.Contains(android::base::INFO, "LambdaOnDeath Uwb service has died", "dalix.Uwb"));
-    EXPECT_FALSE(IsUp("wpan0"));
+    EXPECT_FALSE(driver_.devices().FindByName("wpan0").value().up);
     EXPECT_EQ(driver_.radios().Radio(0)->scheduler, kMcpsSchedulerDefault);
     EXPECT_TRUE(driver_.fira_region().Sessions().empty());
   }
@@ -161,45 +144,31 @@ TEST_F(UwbTest, OneLiveClientAtATimeWhoseDeathStopsFiraRangingAndFreesTheHal) {
   EXPECT_TRUE(next.Open(&error) && next.StartFira("wpan0", options, &error)) << error;
   EXPECT_TRUE(next.Stop(&error)) << error;
   EXPECT_THAT(Names(), IsEmpty());
-  uwb_.reset();
-  service_.Stop();
-  EXPECT_TRUE(log.Contains(android::base::INFO, "UWB HAL start", "dalix.uwb.main"));
-  EXPECT_TRUE(log.Contains(android::base::INFO, "UWB HAL is about to exit", "dalix.uwb.main"));
 }
 
 TEST_F(UwbTest, PairsDevicesWithRadiosByPhyAndLoadsCalibrationByHardwareIndex) {
   AddRadio(3, 1, "wpan1");  // its device is on phy 1
   AddRadio(5, 0, "");       // a radio without a network device
-  sim::WpanDeviceConfig stray;
-  stray.name = "wpan9";  // a device on a phy no radio drives
-  stray.phy_index = 9;
+  // A device on a phy no radio drives.
   std::string error;
-  ASSERT_TRUE(driver_.devices().AddDevice(stray, &error)) << error;
+  ASSERT_TRUE(driver_.devices().AddDevice(sim::WpanDeviceConfig{"wpan9", 9}, &error)) << error;
   StartService();
   TemporaryDir dir;
   const std::string file = std::string(dir.path) + "/calibration";
   ASSERT_TRUE(
       android::base::WriteStringToFile("xtal_trim = 17\nch9.ant0.tx_delay = 16450\n", file));
-  const struct {
-    int64_t hw_index;
-    std::string path;
-    binder_exception_t exception;
-    const char* message;
-  } cases[] = {
-      {3, file, EX_ILLEGAL_STATE, "UWB HAL is not opened"},  // the only case before the open
-      {5, file, EX_ILLEGAL_ARGUMENT, "Unkown hw index"},     // a radio without an interface
-      {-1, file, EX_ILLEGAL_ARGUMENT, "Unkown hw index"},
-      // The service-specific failure carries no code of its own.
-      {3, file + ".missing", EX_SERVICE_SPECIFIC, "Failed to load calibration"},
-  };
-  for (const auto& c : cases) {
-    SCOPED_TRACE(c.message);
-    ndk::ScopedAStatus status = uwb_->loadCalibration(c.hw_index, c.path);
-    EXPECT_EQ(status.getExceptionCode(), c.exception);
-    EXPECT_STREQ(status.getMessage(), c.message);
+  // Before the open; then a radio without an interface; then a file that
+  // is not there, whose service-specific failure carries no code of its own.
+  for (auto [hw_index, path, exception, message] :
+       {std::tuple(3, file, EX_ILLEGAL_STATE, "UWB HAL is not opened"),
+        std::tuple(5, file, EX_ILLEGAL_ARGUMENT, "Unkown hw index"),
+        std::tuple(3, file + ".missing", EX_SERVICE_SPECIFIC, "Failed to load calibration")}) {
+    ndk::ScopedAStatus status = uwb_->loadCalibration(hw_index, path);
+    EXPECT_EQ(status.getExceptionCode(), exception);
+    EXPECT_STREQ(status.getMessage(), message);
     EXPECT_EQ(status.getServiceSpecificError(), 0);
     EXPECT_THAT(driver_.radios().Radio(3)->calibration, IsEmpty());
-    if (c.exception == EX_ILLEGAL_STATE) {
+    if (exception == EX_ILLEGAL_STATE) {
       ASSERT_TRUE(uwb_->open(ndk::SharedRefBase::make<Client>()).isOk());
     }
   }
@@ -215,10 +184,10 @@ TEST_F(UwbTest, PairsDevicesWithRadiosByPhyAndLoadsCalibrationByHardwareIndex) {
   ndk::ScopedAStatus status = uwb_->getIface("wpan9", &iface);
   EXPECT_EQ(status.getExceptionCode(), EX_ILLEGAL_ARGUMENT);
   EXPECT_STREQ(status.getMessage(), "Unknown iface wpan9");
-  EXPECT_EQ(iface, nullptr);
 
   // A refused listing is an unknown error and leaves the caller's list alone.
-  Refuse(kMcpsFamilyName, MCPS802154_CMD_GET_HW, EIO);
+  driver_.simulator().SetCommandFault(kMcpsFamilyName, MCPS802154_CMD_GET_HW,
+                                      sim::Fault{sim::Fault::Kind::kError, EIO});
   EXPECT_EQ(uwb_->listHardwareIndex(&indices).getStatus(), STATUS_UNKNOWN_ERROR);
   EXPECT_THAT(indices, ElementsAre(3, 5));
 }
@@ -248,7 +217,9 @@ TEST_F(UwbTest, RangesTheSimulatedPeersInBothModesAndStartsCccWhateverTheDrivers
   driver_.world().AddPeer(sim::Peer{0xa, kPeerA, sim::Motion::Standing({2.1, 1.2, -0.6})});
   driver_.world().AddPeer(sim::Peer{0xb, kPeerB, sim::Motion::Standing({4.3, -6.7, 0.8})});
   StartService();
-  std::shared_ptr<uwb::IUwbIface> iface = OpenIface("wpan0");
+  ASSERT_TRUE(uwb_->open(ndk::SharedRefBase::make<Client>()).isOk());
+  std::shared_ptr<uwb::IUwbIface> iface;
+  ASSERT_TRUE(uwb_->getIface("wpan0", &iface).isOk());
   std::shared_ptr<uwb::ISimpleRangingController> simple;
   ASSERT_TRUE(iface->simpleRangingController(&simple).isOk());
   for (bool responder : {false, true}) {
@@ -275,7 +246,6 @@ TEST_F(UwbTest, RangesTheSimulatedPeersInBothModesAndStartsCccWhateverTheDrivers
     EXPECT_TRUE(std::isnan(first[3].firstAngleRad) && std::isnan(first[3].secondAngleRad));
 
     ASSERT_TRUE(simple->stop().isOk());
-    EXPECT_FALSE(IsUp("wpan0"));
   }
 
   // CCC: the start succeeds and reports 123000 whatever code the driver
@@ -284,7 +254,7 @@ TEST_F(UwbTest, RangesTheSimulatedPeersInBothModesAndStartsCccWhateverTheDrivers
   ASSERT_TRUE(iface->cccController(&ccc).isOk());
   LogCapture log;
   ASSERT_TRUE(ccc->openCccSession().isOk());
-  for (std::optional<uint8_t> code : {std::optional<uint8_t>(1), std::optional<uint8_t>(0)}) {
+  for (uint8_t code : {1, 0}) {
     driver_.ccc_test_mode().SetReturnCode(code);
     int64_t result = 0;
     ASSERT_TRUE(ccc->startCccSession(1, 2, 9, &result).isOk());
@@ -298,7 +268,8 @@ TEST_F(UwbTest, RangesTheSimulatedPeersInBothModesAndStartsCccWhateverTheDrivers
   EXPECT_EQ(starts[1].channel, 9);
   EXPECT_EQ(starts[1].u32_param, 123000u);
 
-  Refuse(kMcpsFamilyName, MCPS802154_CMD_TESTMODE, EPERM);
+  driver_.simulator().SetCommandFault(kMcpsFamilyName, MCPS802154_CMD_TESTMODE,
+                                      sim::Fault{sim::Fault::Kind::kError, EPERM});
   int64_t result = 0;
   EXPECT_EQ(ccc->startCccSession(1, 2, 9, &result).getExceptionCode(), -7);
   EXPECT_EQ(result, 0);

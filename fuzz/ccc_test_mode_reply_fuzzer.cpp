@@ -9,7 +9,7 @@
 
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   hardware::dalix::UniqueNlMsg msg;
-  if (hardware::dalix::fuzz::FrameGenericMessage(data, size, 0x1a, &msg)) {
+  if (hardware::dalix::fuzz::FrameGenericMessage(data, size, &msg)) {
     hardware::dalix::CccRegionUtils::ParseTestModeCmdResponse(msg.get());
   }
   return 0;

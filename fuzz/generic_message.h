@@ -19,12 +19,16 @@ namespace hardware {
 namespace dalix {
 namespace fuzz {
 
+// The family id the messages are framed with: the parsers under test read
+// the command and the attributes only.
+constexpr int kMessageFamily = 0x1a;
+
 // Puts |data| into the empty |msg| as libnl would deliver it: nlmsg_len
 // covers exactly the headers and the attribute stream. False when there is
 // no command byte or the input is larger than a page.
-inline bool FrameGenericMessage(const uint8_t* data, size_t size, int family, UniqueNlMsg* msg) {
+inline bool FrameGenericMessage(const uint8_t* data, size_t size, UniqueNlMsg* msg) {
   if (size == 0 || size > 4096) return false;
-  if (genlmsg_put(msg->get(), 0, 0, family, 0, 0, data[0], 0) == nullptr) return false;
+  if (genlmsg_put(msg->get(), 0, 0, kMessageFamily, 0, 0, data[0], 0) == nullptr) return false;
   return size == 1 || nlmsg_append(msg->get(), const_cast<uint8_t*>(data + 1), size - 1, 1) == 0;
 }
 

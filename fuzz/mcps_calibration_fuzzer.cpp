@@ -12,8 +12,14 @@ using hardware::dalix::ConfigUtils;
 using hardware::dalix::McpsUtils;
 using hardware::dalix::fuzz::ScriptedDriver;
 
-// Shared with the seed program, which must send the same keys.
-ConfigUtils* CalibrationStore();
+// The seed program sends the same keys.
+ConfigUtils* CalibrationStore() {
+  static ConfigUtils store;
+  for (int i = 0; i < 300; ++i) {
+    store.Set(("cal.key_" + std::to_string(i)).c_str(), std::to_string(i).c_str());
+  }
+  return &store;
+}
 
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   static ScriptedDriver driver;
@@ -22,12 +28,4 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   McpsUtils mcps(driver.factory());
   mcps.SetCalibration(0, store);
   return 0;
-}
-
-ConfigUtils* CalibrationStore() {
-  static ConfigUtils store;
-  for (int i = 0; i < 300; ++i) {
-    store.Set(("cal.key_" + std::to_string(i)).c_str(), std::to_string(i).c_str());
-  }
-  return &store;
 }

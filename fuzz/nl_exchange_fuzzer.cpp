@@ -28,8 +28,7 @@ UniqueNlMsg Request(uint8_t cmd) {
 void CheckWhole(nl_msg* msg) {
   const nlmsghdr* header = nlmsg_hdr(msg);
   CHECK(header->nlmsg_len >= NLMSG_LENGTH(GENL_HDRLEN));
-  CHECK_EQ(genlmsg_hdr(const_cast<nlmsghdr*>(header))->cmd,
-           hardware::dalix::MCPS802154_CMD_NEW_HW);
+  CHECK_EQ(genlmsg_hdr(const_cast<nlmsghdr*>(header))->cmd, hardware::dalix::MCPS802154_CMD_NEW_HW);
 }
 
 }  // namespace

@@ -18,8 +18,6 @@ namespace hardware {
 namespace dalix {
 namespace {
 
-constexpr int kFamily = 0x1a;
-
 // Takes the requests and watches nothing: reports are handed in directly.
 class AcceptingSocket : public NlSocket {
  public:
@@ -64,7 +62,7 @@ McpsUtils* RangingMcpsUtils() {
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   using namespace hardware::dalix;
   UniqueNlMsg msg;
-  if (!fuzz::FrameGenericMessage(data, size, kFamily, &msg)) return 0;
+  if (!fuzz::FrameGenericMessage(data, size, &msg)) return 0;
   RangingMcpsUtils()->OnRangingResult(msg.get());
   return 0;
 }

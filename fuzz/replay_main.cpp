@@ -2,12 +2,11 @@
 // on every file named, or found directly inside a named directory, so that
 // seeds and crash reproducers replay as ordinary tests (under the sanitizers
 // in the sanitizer build).
-#include <dirent.h>
-#include <sys/stat.h>
-
 #include <cstdint>
 #include <cstdio>
+#include <filesystem>
 #include <string>
+#include <system_error>
 #include <vector>
 
 #include <android-base/file.h>
@@ -17,20 +16,16 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size);
 
 namespace {
 
-void Collect(const std::string& path, std::vector<std::string>* files) {
-  struct stat info;
-  if (stat(path.c_str(), &info) != 0) return;  // an empty corpus may not exist
-  if (!S_ISDIR(info.st_mode)) {
-    files->push_back(path);
+// An empty corpus may not exist: nothing to replay then.
+void Collect(const std::filesystem::path& path, std::vector<std::string>* files) {
+  std::error_code error;
+  if (!std::filesystem::is_directory(path, error)) {
+    if (std::filesystem::exists(path, error)) files->push_back(path);
     return;
   }
-  DIR* dir = opendir(path.c_str());
-  if (dir == nullptr) return;
-  while (dirent* entry = readdir(dir)) {
-    if (entry->d_name[0] == '.') continue;
-    files->push_back(path + "/" + entry->d_name);
+  for (const auto& entry : std::filesystem::directory_iterator(path, error)) {
+    if (entry.path().filename().string()[0] != '.') files->push_back(entry.path());
   }
-  closedir(dir);
 }
 
 }  // namespace

@@ -2,9 +2,9 @@
 // byte-level changes, half the time one message's payload is mutated and its
 // netlink length fixed up, so that the datagram's framing stays valid and the
 // change reaches the attribute parsers instead of libnl's framing checks.
+#include <algorithm>
 #include <cstddef>
 #include <cstdint>
-#include <algorithm>
 #include <cstring>
 #include <random>
 #include <string>
@@ -76,8 +76,8 @@ extern "C" size_t LLVMFuzzerCustomMutator(uint8_t* data, size_t size, size_t max
   // The message's slot runs to its aligned end (or the datagram's), so the
   // messages after it keep their alignment.
   const size_t record_end = record.offset + record.length;
-  const size_t old_slot = std::min(message + NLMSG_ALIGN(header.nlmsg_len), record_end) -
-                          (message + NLMSG_HDRLEN);
+  const size_t old_slot =
+      std::min(message + NLMSG_ALIGN(header.nlmsg_len), record_end) - (message + NLMSG_HDRLEN);
   header.nlmsg_len = static_cast<uint32_t>(NLMSG_HDRLEN + payload.size());
   if (message + NLMSG_HDRLEN + old_slot < record_end) payload.resize(NLMSG_ALIGN(payload.size()));
   std::string out(reinterpret_cast<char*>(data), size);

@@ -4,7 +4,6 @@
 
 #include <sys/stat.h>
 
-#include <cstring>
 #include <mutex>
 #include <vector>
 
@@ -79,15 +78,3 @@ bool SeedRecorder::Write(const std::string& name, const std::string& script) {
 }  // namespace fuzz
 }  // namespace dalix
 }  // namespace hardware
-
-int main(int argc, char** argv) {
-  if (argc != 2) {
-    fprintf(stderr, "usage: %s CORPUS_DIRECTORY\n", argv[0]);
-    return 2;
-  }
-  // The exchanges' own lines would drown the build's output.
-  android::base::SetMinimumLogSeverity(android::base::ERROR);
-  hardware::dalix::fuzz::SeedRecorder recorder(argv[1]);
-  if (!recorder.Start()) return 1;
-  return WriteSeeds(recorder) ? 0 : 1;
-}

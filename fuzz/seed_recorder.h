@@ -52,7 +52,3 @@ class SeedRecorder {
 }  // namespace fuzz
 }  // namespace dalix
 }  // namespace hardware
-
-// Each target's seed program defines this: it fills the simulator's world,
-// records and writes its seeds, and returns false on any failure.
-bool WriteSeeds(hardware::dalix::fuzz::SeedRecorder& recorder);

@@ -1,10 +1,8 @@
 """Tests of the interface library generator and of the frozen API."""
 
-import contextlib
-import glob
-import io
 import os
 import pathlib
+import re
 import shutil
 import subprocess
 import sys
@@ -19,42 +17,32 @@ import api_dump  # noqa: E402
 from aidl_parser import parse_package  # noqa: E402
 
 SOURCE_DIR = os.environ.get('DALIX_SOURCE_DIR', os.path.join(HERE, '..', '..', '..'))
-PACKAGE_DIR = os.path.join(SOURCE_DIR, 'aidl', 'aidl', 'hardware', 'dalix', 'uwb')
 API_DIR = os.path.join(SOURCE_DIR, 'aidl', 'aidl_api', 'aidl.hardware.dalix.uwb')
-SOURCES = sorted(glob.glob(os.path.join(PACKAGE_DIR, '*.aidl')))
+SOURCES = sorted(map(str, pathlib.Path(SOURCE_DIR, 'aidl/aidl/hardware/dalix/uwb').glob('*.aidl')))
+IMPORT = 'import aidl.hardware.dalix.uwb.'
 
-# (file, what follows its package line, line of the error, reason).
+# (what follows the package line, and @VintfStability unless it imports; line
+# of the error; reason). Each file is named after the type it declares.
 REFUSALS = [
-    ('IOneway', 'interface IOneway {\n    oneway void f();\n}\n', 4,
-     'oneway methods are not supported'),
-    ('Big', '@Backing(type="byte")\nenum Big {\n    A = 127,\n    B,\n}\n', 6,
-     'does not fit the byte backing'),
-    ('Holder', 'parcelable Holder {\n\n    Map<String, String> m;\n}\n', 5,
-     'type Map is not supported by the NDK back end'),
-    ('Unimported', 'parcelable Unimported {\n    Other o;\n}\n', 4, "Failed to resolve 'Other'"),
-    ('Unknown', 'parcelable Unknown {\n    aidl.hardware.dalix.uwb.Nowhere n;\n}\n', 4,
-     "Failed to resolve 'Nowhere'"),
-    ('Foreign', 'parcelable Foreign {\n    android.os.Thing t;\n}\n', 4,
-     "Failed to resolve 'android.os.Thing'"),
-    ('IInout', 'interface IInout {\n    void f(inout int x);\n}\n', 4,
-     "'int x' can be an in parameter only"),
-    ('ITwice', 'interface ITwice {\n    void f(int x, long x);\n}\n', 4,
-     "method 'f' has duplicate argument name 'x'"),
-    ('IBad', 'interface IBad {\n    union x;\n}\n', 4,
-     'nested "union" declarations are not supported'),
-    ('Lonely', 'import aidl.hardware.dalix.uwb.Missing;\n@VintfStability\nparcelable Lonely {\n}\n',
-     2, "Couldn't find import for class aidl.hardware.dalix.uwb.Missing"),
-    ('Twice', 'import aidl.hardware.dalix.uwb.Other;\nimport aidl.hardware.dalix.uwb.Other;\n',
-     3, 'import aidl.hardware.dalix.uwb.Other is duplicated'),
+    ('interface IOneway {\noneway void f();\n}\n', 4, 'oneway methods are not supported'),
+    ('@Backing(type="byte")\nenum Big {\nA = 127,\nB,\n}\n', 6, 'does not fit the byte backing'),
+    ('parcelable Holder {\n\nMap<String, String> m;\n}\n', 5, 'type Map is not supported by'),
+    ('parcelable Unimported {\nOther o;\n}\n', 4, "Failed to resolve 'Other'"),
+    ('parcelable Unknown {\naidl.hardware.dalix.uwb.Nowhere n;\n}\n', 4, "resolve 'Nowhere'"),
+    ('parcelable Foreign {\nandroid.os.Thing t;\n}\n', 4, "resolve 'android.os.Thing'"),
+    ('interface IInout {\nvoid f(inout int x);\n}\n', 4, "'int x' can be an in parameter only"),
+    ('interface ITwice {\nvoid f(int x, long x);\n}\n', 4, "'f' has duplicate argument name 'x'"),
+    ('interface IBad {\nunion x;\n}\n', 4, 'nested "union" declarations are not supported'),
+    (IMPORT + 'Missing;\n@VintfStability\nparcelable Lonely {\n}\n', 2,
+     "Couldn't find import for class aidl.hardware.dalix.uwb.Missing"),
+    (IMPORT + 'Other;\n' + IMPORT + 'Other;\nparcelable Twice {}\n', 3, 'uwb.Other is duplicated'),
 ]
 
 
 def generator(*args):
-    """Runs the generator's command line; its status and what it printed."""
-    out, err = io.StringIO(), io.StringIO()
-    with contextlib.redirect_stdout(out), contextlib.redirect_stderr(err):
-        status = aidl_gen.main(list(args))
-    return status, out.getvalue(), err.getvalue()
+    run = subprocess.run([sys.executable, '-B', aidl_gen.__file__, *args], capture_output=True,
+                         text=True)
+    return run.returncode, run.stdout, run.stderr
 
 
 def hash_recipe(frozen, previous):
@@ -72,21 +60,19 @@ def read_tree(root):
 
 class GeneratorTest(unittest.TestCase):
     def setUp(self):
-        self.dir = tempfile.mkdtemp()
-        self.addCleanup(shutil.rmtree, self.dir)
+        self.dir = self.enterContext(tempfile.TemporaryDirectory())
 
-    def write(self, name, text):
-        """|text| follows the package line, and @VintfStability unless it imports."""
-        path = os.path.join(self.dir, name + '.aidl')
+    def write(self, text):
+        path = os.path.join(self.dir, re.search(r'(\w+) {', text).group(1) + '.aidl')
         stability = '' if text.startswith('import') else '@VintfStability\n'
         pathlib.Path(path).write_text('package aidl.hardware.dalix.uwb;\n' + stability + text)
         return path
 
     def test_refusals_name_file_line_and_reason(self):
-        other = self.write('Other', 'parcelable Other {\n    int x;\n}\n')
-        for name, text, line, reason in REFUSALS:
-            with self.subTest(name):
-                path = self.write(name, text)
+        other = self.write('parcelable Other {\n    int x;\n}\n')
+        for text, line, reason in REFUSALS:
+            with self.subTest(text):
+                path = self.write(text)
                 status, out, err = generator('outputs', '--out', self.dir, path, other)
                 self.assertEqual((1, ''), (status, out))
                 self.assertTrue(err.startswith('aidl_gen: error: %s:%d: ' % (path, line)), err)
@@ -94,12 +80,8 @@ class GeneratorTest(unittest.TestCase):
 
     def test_frozen_versions_are_the_sources_dump_hashed_as_the_platform_does(self):
         expected = dict(api_dump.frozen_contents(parse_package(SOURCES)))
-        self.assertEqual(34, len(expected))
         for version in ('1', 'current'):
             self.assertEqual(expected, read_tree(os.path.join(API_DIR, version)), version)
-        # A dump names every type in full and imports nothing, and reads back the same.
-        dumps = [os.path.join(API_DIR, '1', p) for p in expected]
-        self.assertEqual(expected, dict(api_dump.frozen_contents(parse_package(dumps))))
 
         # A throwaway version 2 hashes with the version before it.
         api = os.path.join(self.dir, 'aidl_api')
@@ -117,6 +99,3 @@ class GeneratorTest(unittest.TestCase):
             status, _, err = generator(*args, '--api-dir', api, *SOURCES)
             self.assertEqual(1, status)
             self.assertIn(reason, err)
-
-if __name__ == '__main__':
-    unittest.main()

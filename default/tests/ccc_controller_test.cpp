@@ -2,22 +2,25 @@
 
 #include <functional>
 #include <memory>
+#include <optional>
+#include <string>
 #include <vector>
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include "net/mcps802154.h"
+#include "sim/ccc_test_mode_sim.h"
+#include "sim/driver_simulator.h"
+#include "tests/log_capture.h"
 #include "tests/mock_driver_clients.h"
 
 namespace hardware {
 namespace dalix {
 namespace {
 
-using ::testing::_;
-using ::testing::DoAll;
+using ::android::base::ERROR;
 using ::testing::Return;
-using ::testing::SetArgPointee;
-using ::testing::StrEq;
 
 class CccControllerTest : public DriverClientsTest {
  protected:
@@ -26,13 +29,6 @@ class CccControllerTest : public DriverClientsTest {
       EXPECT_CALL(mcps_, SetScheduler(kHw, McpsScheduler::kDefault, McpsUtils::kNoSlotDuration,
                                       McpsUtils::kNoNodeType, false))
           .WillOnce(Return(ok));
-    };
-  }
-  Step Start(bool ok) {
-    // |first| goes on as its 32-bit pattern.
-    return [=] {
-      EXPECT_CALL(ccc_, StartCccSession(kHw, 0xfffffff0u, 77u, 9, _))
-          .WillOnce(DoAll(SetArgPointee<4>(0xfffffff0u), Return(ok)));
     };
   }
   std::function<ndk::ScopedAStatus()> StartCall(int64_t timeref, int32_t channel) {
@@ -44,6 +40,7 @@ class CccControllerTest : public DriverClientsTest {
   int64_t result_ = -1;
 };
 
+// The start through the driver, its refusal included, is proven end to end.
 TEST_F(CccControllerTest, EveryDriverOrInterfaceFailureIsMinusSeven) {
   // Clients tell CCC failures apart by this exact code.
   static_assert(CccController::kCccIllegalState == -7);
@@ -57,13 +54,35 @@ TEST_F(CccControllerTest, EveryDriverOrInterfaceFailureIsMinusSeven) {
   Run({Hw(true, "endless"), IsUp(false), Default(false)}, open, -7);
   Run({}, StartCall(-1, 9), EX_ILLEGAL_ARGUMENT, "Timeref cannot be negative");
   Run({}, StartCall(77, 16), EX_ILLEGAL_ARGUMENT, "Incorrect channel value 16");
-  Run({Hw(true, "default"), IsUp(true), Start(false)}, StartCall(77, 9), -7);
-  EXPECT_EQ(result_, -1);  // written on success only, zero-extended
+  // |first| goes on as its 32-bit pattern; the driver's value comes back zero-extended.
+  auto start = [this] {
+    EXPECT_CALL(ccc_, StartCccSession(kHw, 0xfffffff0u, 77u, 9, ::testing::_))
+        .WillOnce(::testing::DoAll(::testing::SetArgPointee<4>(0xfffffff0u), Return(true)));
+  };
   Run({Hw(true, "endless"), IsUp(true), Up(false, true), Default(true), IsUp(false), Up(true, true),
-       Start(true)},
+       start},
       StartCall(77, 9), EX_NONE);
   EXPECT_EQ(result_, 0xfffffff0);
-  EXPECT_TRUE(controller_->onOpenCccSessionDone().isOk());
+}
+
+// Replies with a code, zero included, are proven end to end; these lack one.
+TEST(CccRegionUtilsTest, EachFaultIsRefusedWithOneErrorLine) {
+  constexpr char kTag[] = "dalix.uwb.CccRegionUtils";
+  LogCapture log;
+  uint32_t value = 5;
+  EXPECT_FALSE(CccRegionUtils(nullptr).StartCccSession(0, 1, 2, 9, &value));
+  EXPECT_EQ(value, 5u);
+  EXPECT_EQ(log.Count(ERROR, "StartRegionMessage: MCPS netlink id is not resolved", kTag), 1);
+  for (bool with_testdata : {true, false}) {
+    log.Reset();
+    UniqueNlMsg reply = sim::DriverSimulator::NewEvent(0x1c, MCPS802154_CMD_TESTMODE);
+    if (with_testdata) sim::CccTestModeSim::EncodeTestModeReply(reply.get(), 0, std::nullopt);
+    EXPECT_FALSE(CccRegionUtils::ParseTestModeCmdResponse(reply.get()));
+    const char* missing = with_testdata ? "KX7200_TM_ATTR_CCC_CMD_RC" : "MCPS802154_ATTR_TESTDATA";
+    EXPECT_EQ(log.Count(ERROR, std::string("ParseTestModeCmdResponse: Missing ") + missing, kTag),
+              1)
+        << log.Text();
+  }
 }
 
 }  // namespace

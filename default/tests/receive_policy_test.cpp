@@ -24,47 +24,14 @@ int Width(uint16_t type) {
   return width == widths.end() ? 0 : width->second;
 }
 
-// A policy indexed by attribute id, its last entry the nest's maximum id.
-struct Policy {
-  template <typename Entries>
-  Policy(const char* name, const Entries& entries)
-      : name(name), entries(std::data(entries)), max_id(std::size(entries) - 1) {}
-  const char* name;
-  const nla_policy* entries;
-  int max_id;
-};
-
 // Every policy that a parser of received messages uses, on either side.
 TEST(ReceivePolicyTest, EveryIntegerIsReadOnlyAtItsFullWidth) {
-  const Policy policies[] = {
-      {"NewHw", kMcpsNewHwPolicy},
-      {"Calibration", kMcpsCalibrationPolicy},
-      {"RangingReport", kMcpsRangingReportPolicy},
-      {"RangingResult", kMcpsRangingResultPolicy},
-      {"TestDataReply", kMcpsTestDataReplyPolicy},
-      {"Request", kMcpsRequestPolicy},
-      {"SchedulerParams", kMcpsSchedulerParamsPolicy},
-      {"Region", kMcpsRegionPolicy},
-      {"CalibrationRequest", kMcpsCalibrationRequestPolicy},
-      {"TestDataRequest", kMcpsTestDataRequestPolicy},
-      {"RangingRequest", kMcpsRangingRequestPolicy},
-      {"FiraRegionCallMessage", kFiraRegionCallMessagePolicy},
-      {"FiraRegionCall", kFiraRegionCallPolicy},
-      {"FiraSessionNtf", kFiraSessionNtfPolicy},
-      {"FiraRangingData", kFiraRangingDataPolicy},
-      {"FiraMeasurement", kFiraMeasurementPolicy},
-      {"FiraAoa", kFiraAoaPolicy},
-      {"FiraCall", kFiraCallPolicy},
-      {"FiraSessionParams", kFiraSessionParamsPolicy},
-      {"FiraControlee", kFiraControleePolicy},
-      {"Nl802154", Nl802154AttributePolicy()},
-      {"Nl802154Capability", Nl802154CapabilityAttributePolicy()},
-      {"TestFamily", sim::kTestPolicy},
-  };
   int integers = 0;
-  for (const Policy& policy : policies) {
-    for (int id = 1; id <= policy.max_id; ++id) {
-      const int width = Width(policy.entries[id].type);
+  // |entries| is indexed by attribute id, its last entry the nest's maximum id.
+  auto check = [&](const char* name, const auto& entries) {
+    const int max_id = static_cast<int>(std::size(entries)) - 1;
+    for (int id = 1; id <= max_id; ++id) {
+      const int width = Width(entries[id].type);
       if (width == 0) continue;
       ++integers;
       for (int length = 0; length <= width + 1; ++length) {
@@ -73,14 +40,37 @@ TEST(ReceivePolicyTest, EveryIntegerIsReadOnlyAtItsFullWidth) {
         std::vector<uint8_t> bytes(length, 0xA5);
         ASSERT_EQ(0, nla_put(msg.get(), id, length, bytes.data()));
         nla_nest_end(msg.get(), nest);
-        std::vector<nlattr*> attrs(policy.max_id + 1);
-        int result = nla_parse_nested(attrs.data(), policy.max_id, nest,
-                                      const_cast<nla_policy*>(policy.entries));
+        std::vector<nlattr*> attrs(max_id + 1);
+        int result = nla_parse_nested(attrs.data(), max_id, nest,
+                                      const_cast<nla_policy*>(std::data(entries)));
         EXPECT_EQ(length == width, result == 0)
-            << policy.name << " attribute " << id << " of " << length << " bytes";
+            << name << " attribute " << id << " of " << length << " bytes";
       }
     }
-  }
+  };
+  check("NewHw", kMcpsNewHwPolicy);
+  check("Calibration", kMcpsCalibrationPolicy);
+  check("RangingReport", kMcpsRangingReportPolicy);
+  check("RangingResult", kMcpsRangingResultPolicy);
+  check("TestDataReply", kMcpsTestDataReplyPolicy);
+  check("Request", kMcpsRequestPolicy);
+  check("SchedulerParams", kMcpsSchedulerParamsPolicy);
+  check("Region", kMcpsRegionPolicy);
+  check("CalibrationRequest", kMcpsCalibrationRequestPolicy);
+  check("TestDataRequest", kMcpsTestDataRequestPolicy);
+  check("RangingRequest", kMcpsRangingRequestPolicy);
+  check("FiraRegionCallMessage", kFiraRegionCallMessagePolicy);
+  check("FiraRegionCall", kFiraRegionCallPolicy);
+  check("FiraSessionNtf", kFiraSessionNtfPolicy);
+  check("FiraRangingData", kFiraRangingDataPolicy);
+  check("FiraMeasurement", kFiraMeasurementPolicy);
+  check("FiraAoa", kFiraAoaPolicy);
+  check("FiraCall", kFiraCallPolicy);
+  check("FiraSessionParams", kFiraSessionParamsPolicy);
+  check("FiraControlee", kFiraControleePolicy);
+  check("Nl802154", Nl802154AttributePolicy());
+  check("Nl802154Capability", Nl802154CapabilityAttributePolicy());
+  check("TestFamily", sim::kTestPolicy);
   EXPECT_GE(integers, 40);
 }
 

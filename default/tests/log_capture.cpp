@@ -1,7 +1,6 @@
 #include "tests/log_capture.h"
 
 #include <algorithm>
-#include <sstream>
 
 namespace hardware {
 namespace dalix {
@@ -36,11 +35,11 @@ int LogCapture::Count(android::base::LogSeverity severity, const std::string& me
 
 std::string LogCapture::Text() const {
   std::lock_guard<std::mutex> lock(mutex_);
-  std::ostringstream out;
+  std::string text;
   for (const Entry& entry : entries_) {
-    out << entry.severity << " " << entry.tag << ": " << entry.message << "\n";
+    text += std::to_string(entry.severity) + " " + entry.tag + ": " + entry.message + "\n";
   }
-  return out.str();
+  return text;
 }
 
 void LogCapture::Reset() {

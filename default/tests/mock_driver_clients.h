@@ -1,7 +1,6 @@
 #pragma once
 
 #include <functional>
-#include <string>
 #include <vector>
 
 #include <android/binder_auto_utils.h>
@@ -37,7 +36,6 @@ class MockMcpsUtils : public McpsUtils {
   MOCK_METHOD(bool, SetFiraRegion, (uint32_t hw_index), (override));
   MOCK_METHOD(bool, SetRangingRequests,
               (uint32_t hw_index, const std::vector<RangingRequest>& requests), (override));
-  MOCK_METHOD(void, SubscribeRangingResults, (RangingResultHandler handler), (override));
 };
 
 class MockIeeeUtils : public IeeeUtils {

@@ -77,8 +77,9 @@ bool WriteMcpsCalibrationSeeds(SeedRecorder& recorder) {
   auto transfer = [&]() { mcps.SetCalibration(0, &store); };
   recorder.radios().AddRadio(0, 0);
   bool written = recorder.Write("some_refused", recorder.Record(transfer));
-  for (int i = 3; i < 300; i += 7)
+  for (int i = 3; i < 300; i += 7) {
     recorder.radios().AddCalibrationKey("cal.key_" + std::to_string(i));
+  }
   written &= recorder.Write("all_accepted", recorder.Record(transfer));
   recorder.radios().RemoveRadio(0);
   written &= recorder.Write("no_radio", recorder.Record(transfer));
